@@ -1,9 +1,9 @@
 // The log: patchlogs/orvpatch.log under the home, or standard output when PATCH_DEBUG is set.
 //
 // Every line is one open, one write and one close, so that it is on disk even when the tool is killed and so
-// that others may touch the file between two lines. Sources log only through the macros below, after they have
-// defined LOG_COMPONENT, the name under which they log; there is no default on purpose. Nothing here ever
-// stops a run: a line that cannot be written is reported on standard error (LOG_CANT_WRITE) and dropped.
+// that others may touch the file between two lines. Sources log only through the macros below, after they
+// have defined LOG_COMPONENT, the name under which they log; there is no default on purpose. Nothing here
+// ever stops a run: a line that cannot be written is reported on standard error (LOG_CANT_WRITE) and dropped.
 #pragma once
 
 #include <cstdarg>

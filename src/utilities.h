@@ -38,8 +38,8 @@ public:
   /// Reads a whole file into a new NUL-terminated buffer, which the caller releases with free().
   /// Returns 0, or an error number (22 for anything that is not a readable regular file) and a null buffer.
   static int readFile(const char *name, char **buffer);
-  /// Reads the non-empty lines up to the first NUL byte, and one final piece after the last line end even when
-  /// it is empty. LF and CR LF end a line. Returns 0, or readFile's error number and no lines.
+  /// Reads the non-empty lines up to the first NUL byte, and one final piece after the last line end even
+  /// when it is empty. LF and CR LF end a line. Returns 0, or readFile's error number and no lines.
   static int readFileByLines(const char *name, std::vector<std::string> &lines);
 
   static bool isVEMSInstalled();                 ///< monitoring server

@@ -1,0 +1,29 @@
+// A vector of owned objects that can be handed out as the plain vector of pointers that callers walk.
+#pragma once
+
+#include <memory>
+#include <vector>
+
+template <class T>
+class OwnedList {
+public:
+  OwnedList() = default;
+  OwnedList(const OwnedList &) = delete;
+  OwnedList &operator=(const OwnedList &) = delete;
+  ~OwnedList() {
+    for (T *item : items_)
+      delete item;
+  }
+
+  void append(std::unique_ptr<T> item) {
+    items_.push_back(item.get());
+    item.release();
+  }
+
+  /// The objects stay owned by the list. A caller may reorder them, but neither add nor remove any.
+  std::vector<T *> *items() { return &items_; }
+  const std::vector<T *> *items() const { return &items_; }
+
+private:
+  std::vector<T *> items_;
+};
