@@ -1,0 +1,31 @@
+# How everything here is compiled and linked.
+
+add_library(orvpatch_options INTERFACE)
+target_compile_options(orvpatch_options INTERFACE -Wall -Wextra -Wpedantic -Wconversion -Wshadow)
+if(ORVPATCH_WERROR)
+  target_compile_options(orvpatch_options INTERFACE -Werror)
+endif()
+
+if(ORVPATCH_SANITIZE)
+  target_compile_options(orvpatch_options INTERFACE
+    -fsanitize=${ORVPATCH_SANITIZE} -fno-sanitize-recover=all -fno-omit-frame-pointer)
+  target_link_options(orvpatch_options INTERFACE -fsanitize=${ORVPATCH_SANITIZE})
+endif()
+
+if(ORVPATCH_COVERAGE)
+  target_compile_options(orvpatch_options INTERFACE --coverage -O0 -fprofile-abs-path)
+  target_link_options(orvpatch_options INTERFACE --coverage)
+endif()
+
+if(ORVPATCH_STATIC_RUNTIME)
+  target_link_options(orvpatch_options INTERFACE -static-libstdc++ -static-libgcc)
+endif()
+
+if(ORVPATCH_HARDENED)
+  set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+  target_compile_options(orvpatch_options INTERFACE
+    -fstack-protector-strong -U_FORTIFY_SOURCE -D_FORTIFY_SOURCE=2
+    # The same bytes wherever the sources stand.
+    -ffile-prefix-map=${CMAKE_SOURCE_DIR}=.)
+  target_link_options(orvpatch_options INTERFACE -pie -Wl,-z,relro,-z,now)
+endif()
