@@ -68,9 +68,10 @@ public:
   void loadDir();
 
 private:
-  friend bool recursiveDelete(File *directory);
-
-  bool linkInto(const std::string &target, bool overwrite);
+  int moveTo(const std::string &target, bool overwrite);
+  bool linkTo(const std::string &target, bool keepExisting) const;
+  bool makeMissingDirectories() const;
+  void appendEntry(const std::string &name);
 
   std::string path_;
   bool exists_ = false;

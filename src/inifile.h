@@ -55,7 +55,7 @@ public:
   Section *getSection(const std::string &name) const;
 
 private:
-  void parseLine(std::string line, Section **current, PatchError *err);
+  void parseLine(const std::string &line, Section *&current, PatchError *err);
   Section *openSection(const std::string &line);
 
   std::string path_;

@@ -61,8 +61,9 @@ protected:
     const char *defaultKey;
   };
 
-  /// Runs a control command and traces what it returned; -1 when it could not be run.
-  int runControl(const std::vector<std::string> &command) const;
+  /// Runs a control command and traces what it returned; true for exit status 0. `ran`, when given, tells
+  /// whether it could be run at all.
+  bool runControl(const std::vector<std::string> &command, bool *ran = nullptr) const;
   /// Fills the record and logs, unless the record is null; always false.
   bool reportControlFailure(const ControlFailure &failure, const std::string &instance, bool named,
                             PatchError *err) const;
@@ -71,8 +72,11 @@ protected:
   const std::string &home() const { return home_; }
 
 private:
+  static std::string lookUp(const std::map<std::string, std::string> &values, const std::string &instance);
+  static bool isNamed(const std::string &instance);
+
+  void readRunInfo(const std::vector<std::string> &lines, const std::string &hostName);
   void readRunInfoLine(const std::string &line, const std::string &separator, const std::string &hostName);
-  std::string lookUp(const std::map<std::string, std::string> &values, const std::string &instance) const;
   std::string agentCode() const;
   const char *instanceOption() const;
   std::string startCommandLine(const std::string &instance) const;

@@ -2,6 +2,7 @@
 // and from the run information, and never rebuilt during a run.
 #pragma once
 
+#include <functional>
 #include <string>
 #include <vector>
 
@@ -34,6 +35,8 @@ public:
   void buildComponent(const std::string &path, const std::string &cinfo);
 
 private:
+  ORVComponent *findFirst(const std::function<bool(const ORVComponent &)> &matches) const;
+
   static ORVComponentRegistry *_inst;
 
   std::string home_;

@@ -5,6 +5,7 @@
 #pragma once
 
 #include <string>
+#include <vector>
 
 /// Runs argv[0], looked up on the search path, with the null-terminated vector `argv` and waits for its end.
 ///
@@ -15,6 +16,16 @@
 ///
 /// True when the child was started and waited for, whatever its exit status; false when it was not.
 bool runCommand(char **argv, int *rc, std::string *out, std::string *err);
+
+/// What a command left behind.
+struct CommandResult {
+  int rc = 0;
+  std::string out;
+  std::string err;
+};
+
+/// The same for a command given as its words, with both streams captured.
+bool runCommand(const std::vector<std::string> &words, CommandResult &result);
 
 /// Makes the two pipes, read end first. A pipe that cannot be made is logged and its ends are -1; the result
 /// is true all the same.

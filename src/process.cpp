@@ -1,0 +1,143 @@
+#include "process.h"
+
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+
+#include <fcntl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include "logger.h"
+
+#define LOG_COMPONENT "process.cpp"
+
+namespace {
+
+enum PipeEnd { ReadEnd = 0, WriteEnd = 1 };
+
+/// The two pipes of one child; what is still open at the end is closed.
+struct Pipes {
+  int out[2] = {-1, -1};
+  int err[2] = {-1, -1};
+
+  Pipes() = default;
+  Pipes(const Pipes &) = delete;
+  Pipes &operator=(const Pipes &) = delete;
+  ~Pipes() {
+    closeEnd(ReadEnd);
+    closeEnd(WriteEnd);
+  }
+
+  void closeEnd(PipeEnd end) {
+    for (int *fd : {&out[end], &err[end]}) {
+      if (*fd >= 0)
+        close(*fd);
+      *fd = -1;
+    }
+  }
+};
+
+/// False, with both ends -1 and the reason in errno, when there is no pipe to be had.
+bool makePipe(int *ends) {
+  ends[ReadEnd] = ends[WriteEnd] = -1;
+  if (pipe(ends) != 0)
+    return false;
+  // The child has ended before its output is read, so all of it is in the pipe. A program that it left behind
+  // may still hold the other end: an empty pipe then means no output, and is not to be waited on.
+  static_cast<void>(fcntl(ends[ReadEnd], F_SETFL, O_NONBLOCK));
+  return true;
+}
+
+[[noreturn]] void runChild(char **argv, Pipes &pipes) {
+  pipes.closeEnd(ReadEnd);
+  if (dup2(pipes.out[WriteEnd], STDOUT_FILENO) < 0)
+    LOG_ERROR("Error duping STDOUT");
+  if (dup2(pipes.err[WriteEnd], STDERR_FILENO) < 0)
+    LOG_ERROR("Error duping STDERR");
+  execvp(argv[0], argv);
+  const int error = errno;
+  LOG_ERROR("error calling execvp = %d: %s", error, strerror(error));
+  exit(error);
+}
+
+/// Waits for the one child; false when the system does not tell of any.
+bool waitForChild(int *status) {
+  pid_t child = 0;
+  do
+    child = wait(status);
+  while (child < 0 && errno == EINTR);
+  return child >= 0;
+}
+
+/// One read of at most 4096 bytes, up to the first NUL among them; the rest of a longer output is dropped.
+std::string readOnce(int fd) {
+  char buffer[4096];
+  ssize_t count = 0;
+  do
+    count = read(fd, buffer, sizeof buffer);
+  while (count < 0 && errno == EINTR);
+  return count <= 0 ? std::string() : std::string(buffer, strnlen(buffer, static_cast<std::size_t>(count)));
+}
+
+void deliver(const std::string &output, std::string *destination, FILE *stream) {
+  if (destination != nullptr)
+    destination->append(output);
+  else
+    fprintf(stream, "%s", output.c_str());
+}
+
+} // namespace
+
+bool createPipes(int *outPipe, int *errPipe) {
+  // KEEP(pipes-always-true): a missing pipe costs the child's output, not the run.
+  if (!makePipe(outPipe))
+    LOG_ERROR("Error creating stdOutPipe: %s", strerror(errno));
+  if (!makePipe(errPipe))
+    LOG_ERROR("Error creating stdErrPipe: %s", strerror(errno));
+  return true;
+}
+
+bool runCommand(char **argv, int *rc, std::string *out, std::string *err) {
+  LOG_TRACE("runCommand %s", "entry");
+  for (int i = 0; argv[i] != nullptr; ++i)
+    LOG_TRACE("cmdArray[%d]: %s", i, argv[i]);
+  Pipes pipes;
+  static_cast<void>(createPipes(pipes.out, pipes.err));
+
+  // A child that cannot execute its program ends with exit(), which would write once more what is buffered.
+  fflush(stdout);
+  fflush(stderr);
+  const pid_t child = fork();
+  if (child < 0) {
+    LOG_ERROR("Error calling fork - exiting prematurely");
+    return false;
+  }
+  if (child == 0)
+    runChild(argv, pipes);
+
+  pipes.closeEnd(WriteEnd);
+  // KEEP(wait-before-read): the end comes before the reading, so a child that writes more than a pipe holds
+  // waits for ever. Commands of a patch are expected to be silent.
+  int status = 0;
+  if (!waitForChild(&status))
+    return false;
+  deliver(readOnce(pipes.out[ReadEnd]), out, stdout);
+  deliver(readOnce(pipes.err[ReadEnd]), err, stderr);
+  // KEEP(signal-is-zero): bits 8 to 15 are zero for a child that a signal ended, which callers take as
+  // success.
+  if (rc != nullptr)
+    *rc = (status >> 8) & 0xff;
+  LOG_TRACE("runCommand %s", "exit");
+  return true;
+}
+
+bool runCommand(const std::vector<std::string> &words, CommandResult &result) {
+  std::vector<std::string> storage = words;
+  std::vector<char *> argv;
+  for (std::string &word : storage)
+    argv.push_back(word.data());
+  argv.push_back(nullptr);
+  return runCommand(argv.data(), &result.rc, &result.out, &result.err);
+}
