@@ -18,7 +18,9 @@ if(ORVPATCH_COVERAGE)
 endif()
 
 if(ORVPATCH_STATIC_RUNTIME)
-  target_link_options(orvpatch_options INTERFACE -static-libstdc++ -static-libgcc)
+  # Sections that nothing reaches are dropped: with them would go calls of the newest C libraries, which the
+  # program never makes but would ask for.
+  target_link_options(orvpatch_options INTERFACE -static-libstdc++ -static-libgcc -Wl,--gc-sections)
 endif()
 
 if(ORVPATCH_HARDENED)
