@@ -1,11 +1,13 @@
 #include "scratch.h"
 
+#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
 #include <ostream>
 #include <regex>
 #include <sstream>
+#include <tuple>
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -20,6 +22,16 @@ namespace {
 std::string valueOf(const char *variable) {
   const char *value = getenv(variable);
   return value == nullptr ? "" : value;
+}
+
+/// Gives back the permissions that a test took away; without them an ordinary user could not remove the tree.
+void makeRemovable(const std::string &directory) {
+  std::error_code ignored;
+  fs::permissions(directory, fs::perms::owner_all, fs::perm_options::add, ignored);
+  fs::recursive_directory_iterator entry(directory, ignored);
+  for (; entry != fs::recursive_directory_iterator(); entry.increment(ignored))
+    if (entry->is_directory(ignored) && !entry->is_symlink(ignored))
+      fs::permissions(entry->path(), fs::perms::owner_all, fs::perm_options::add, ignored);
 }
 
 } // namespace
@@ -43,12 +55,15 @@ void ScratchHome::SetUp() {
   glbLogToSTDOUT = false;
   logInit();
   logOffset_ = read(glbLogFileName).size();
+  startDescriptors_ = openDescriptors();
 }
 
 void ScratchHome::TearDown() {
+  EXPECT_EQ(openDescriptors(), startDescriptors_) << "a descriptor was left open";
   delete ORVComponentRegistry::getInstance();
   fs::current_path(startDirectory_);
   setenv("PATH", startPath_.c_str(), 1);
+  makeRemovable(home_);
   std::error_code ignored;
   fs::remove_all(home_, ignored);
 }
@@ -74,13 +89,13 @@ std::string ScratchHome::read(const std::string &path) const {
   return content.str();
 }
 
-std::vector<LogLine> ScratchHome::logLines() {
+LogLines ScratchHome::logLines() {
   static const std::regex prefix(R"(^(ERROR|INFO |TRACE) \d\d:\d\d:\d\d \(([^,]*),(\d+)\): )");
   const std::string all = read(glbLogFileName);
   std::istringstream text(all.substr(logOffset_));
   logOffset_ = all.size();
   sourceLines_.clear();
-  std::vector<LogLine> lines;
+  LogLines lines;
   std::smatch match;
   for (std::string line; std::getline(text, line);) {
     if (std::regex_search(line, match, prefix)) {
@@ -94,7 +109,17 @@ std::vector<LogLine> ScratchHome::logLines() {
   return lines;
 }
 
-bool runsAsRoot() { return geteuid() == 0; }
+LogLines ScratchHome::logLinesOf(const std::string &component) {
+  LogLines lines = logLines();
+  lines.erase(std::remove_if(lines.begin(), lines.end(),
+                             [&](const LogLine &line) { return line.component != component; }),
+              lines.end());
+  return lines;
+}
+
+bool runsAsRoot() {
+  return geteuid() == 0;
+}
 
 LogLine trace(const std::string &component, const std::string &message) {
   return {"TRACE", component, message};
@@ -104,4 +129,36 @@ LogLine info(const std::string &component, const std::string &message) {
 }
 LogLine error(const std::string &component, const std::string &message) {
   return {"ERROR", component, message};
+}
+
+LogLines withoutPointers(LogLines lines) {
+  static const std::regex pointer(R"(\(0x[0-9a-f]+\))");
+  for (LogLine &line : lines)
+    line.message = std::regex_replace(line.message, pointer, "(buffer)");
+  return lines;
+}
+
+bool isThere(const std::string &path) {
+  return fs::exists(fs::symlink_status(path));
+}
+
+mode_t modeOf(const std::string &path) {
+  struct stat status {};
+  EXPECT_EQ(stat(path.c_str(), &status), 0) << path;
+  return status.st_mode & 07777;
+}
+
+bool sameFile(const std::string &a, const std::string &b) {
+  std::error_code ignored;
+  return fs::equivalent(a, b, ignored);
+}
+
+std::size_t openDescriptors() {
+  const fs::directory_iterator descriptors("/proc/self/fd");
+  return static_cast<std::size_t>(std::distance(begin(descriptors), end(descriptors)));
+}
+
+UmaskScope::UmaskScope(mode_t mask) : before_(umask(mask)) {}
+UmaskScope::~UmaskScope() {
+  umask(before_);
 }
