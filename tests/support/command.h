@@ -24,21 +24,21 @@ private:
   std::vector<char *> pointers_;
 };
 
-struct CommandResult {
+struct CapturedRun {
   bool started = false;
   int rc = -1;
   std::string out;
   std::string err;
 };
 
-inline CommandResult capture(std::vector<std::string> words) {
+inline CapturedRun capture(std::vector<std::string> words) {
   ArgumentVector argv(std::move(words));
-  CommandResult result;
+  CapturedRun result;
   result.started = runCommand(argv.get(), &result.rc, &result.out, &result.err);
   return result;
 }
 
 /// The same for a line of shell.
-inline CommandResult captureShell(const std::string &line) {
+inline CapturedRun captureShell(const std::string &line) {
   return capture({"/bin/sh", "-c", line});
 }

@@ -60,6 +60,8 @@ void ScratchHome::SetUp() {
 
 void ScratchHome::TearDown() {
   EXPECT_EQ(openDescriptors(), startDescriptors_) << "a descriptor was left open";
+  glbLogToSTDOUT = false;
+  glbLogFileName = "/dev/null"; // the registry logs, and the test may have made its log unwritable
   delete ORVComponentRegistry::getInstance();
   fs::current_path(startDirectory_);
   setenv("PATH", startPath_.c_str(), 1);

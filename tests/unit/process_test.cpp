@@ -1,0 +1,315 @@
+// Child processes, with real ones: what is captured, what is handed back, what a child inherits.
+#include "process.h"
+
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <sstream>
+#include <string>
+
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include "command.h"
+#include "scratch.h"
+
+namespace {
+
+using ::testing::internal::CaptureStderr;
+using ::testing::internal::CaptureStdout;
+using ::testing::internal::GetCapturedStderr;
+using ::testing::internal::GetCapturedStdout;
+
+constexpr std::size_t KeptOfAStream = 4096;
+
+LogLine processTrace(const std::string &message) {
+  return trace("process.cpp", message);
+}
+LogLine processError(const std::string &message) {
+  return error("process.cpp", message);
+}
+
+/// A line of shell that writes so many "x" to standard output.
+std::string writeBytes(std::size_t count) {
+  return "head -c " + std::to_string(count) + " /dev/zero | tr '\\0' x";
+}
+
+class ProcessTest : public ScratchHome {};
+
+TEST_F(ProcessTest, ListingIsCapturedWithStatusZero) {
+  write("dir/b", "");
+  write("dir/a", "");
+  const CapturedRun ls = capture({"ls", home() + "dir"});
+  EXPECT_TRUE(ls.started);
+  EXPECT_EQ(ls.rc, 0);
+  EXPECT_EQ(ls.out, "a\nb\n");
+  EXPECT_EQ(ls.err, "");
+}
+
+TEST_F(ProcessTest, RunIsTracedWithEveryElementOfTheVector) {
+  capture({"test", "a b", "=", ""});
+  EXPECT_EQ(logLines(), (LogLines{processTrace("runCommand entry"), processTrace("cmdArray[0]: test"),
+                                  processTrace("cmdArray[1]: a b"), processTrace("cmdArray[2]: ="),
+                                  processTrace("cmdArray[3]: "), processTrace("runCommand exit")}));
+}
+
+TEST_F(ProcessTest, StreamsAreToldApart) {
+  const CapturedRun result = captureShell("echo to-out; echo to-err >&2");
+  EXPECT_EQ(result.out, "to-out\n");
+  EXPECT_EQ(result.err, "to-err\n");
+}
+
+TEST_F(ProcessTest, OutputIsAppendedToWhatTheStringsHold) {
+  ArgumentVector argv({"/bin/sh", "-c", "echo more; echo worse >&2"});
+  std::string out = "before ";
+  std::string err = "bad ";
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, &out, &err));
+  EXPECT_EQ(out, "before more\n");
+  EXPECT_EQ(err, "bad worse\n");
+}
+
+TEST_F(ProcessTest, WithoutAStringOutputGoesToTheOwnStandardOutput) {
+  ArgumentVector argv({"/bin/sh", "-c", "echo 'shown 100%s'; echo kept >&2"});
+  std::string err;
+  CaptureStdout();
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, nullptr, &err));
+  EXPECT_EQ(GetCapturedStdout(), "shown 100%s\n");
+  EXPECT_EQ(err, "kept\n");
+}
+
+TEST_F(ProcessTest, WithoutAStringErrorsGoToTheOwnStandardError) {
+  ArgumentVector argv({"/bin/sh", "-c", "echo kept; echo 'shown 100%s' >&2"});
+  std::string out;
+  CaptureStderr();
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, &out, nullptr));
+  EXPECT_EQ(GetCapturedStderr(), "shown 100%s\n");
+  EXPECT_EQ(out, "kept\n");
+}
+
+TEST_F(ProcessTest, BothStreamsAndTheStatusMayBeLeftOut) {
+  ArgumentVector argv({"/bin/sh", "-c", "echo out; echo err >&2; exit 9"});
+  CaptureStdout();
+  CaptureStderr();
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, nullptr, nullptr));
+  EXPECT_EQ(GetCapturedStdout(), "out\n");
+  EXPECT_EQ(GetCapturedStderr(), "err\n");
+}
+
+TEST_F(ProcessTest, SilentProgramLeavesTheStringsAlone) {
+  ArgumentVector argv({"true"});
+  std::string out = "kept";
+  std::string err = "too";
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, &out, &err));
+  EXPECT_EQ(out, "kept");
+  EXPECT_EQ(err, "too");
+}
+
+TEST_F(ProcessTest, OnlyTheFirst4096BytesAreKept) {
+  EXPECT_EQ(captureShell(writeBytes(10000)).out, std::string(KeptOfAStream, 'x'));
+  EXPECT_EQ(captureShell(writeBytes(10000) + " >&2").err, std::string(KeptOfAStream, 'x'));
+}
+
+TEST_F(ProcessTest, Exactly4096BytesAreKeptWhole) {
+  EXPECT_EQ(captureShell(writeBytes(KeptOfAStream)).out, std::string(KeptOfAStream, 'x'));
+  EXPECT_EQ(captureShell(writeBytes(KeptOfAStream - 1)).out, std::string(KeptOfAStream - 1, 'x'));
+}
+
+TEST_F(ProcessTest, OnlyTheFirst4096BytesArePrinted) {
+  ArgumentVector argv({"/bin/sh", "-c", writeBytes(5000)});
+  CaptureStdout();
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, nullptr, nullptr));
+  EXPECT_EQ(GetCapturedStdout(), std::string(KeptOfAStream, 'x'));
+}
+
+TEST_F(ProcessTest, OutputEndsAtTheFirstNul) {
+  EXPECT_EQ(captureShell("printf 'shown\\0hidden'").out, "shown");
+  EXPECT_EQ(captureShell("printf 'shown\\0hidden' >&2").err, "shown");
+  EXPECT_EQ(captureShell("printf '\\0hidden'").out, "");
+}
+
+TEST_F(ProcessTest, PrintedOutputEndsAtTheFirstNulToo) {
+  ArgumentVector argv({"/bin/sh", "-c", "printf 'out\\0hidden'; printf 'err\\0hidden' >&2"});
+  CaptureStdout();
+  CaptureStderr();
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, nullptr, nullptr));
+  EXPECT_EQ(GetCapturedStdout(), "out");
+  EXPECT_EQ(GetCapturedStderr(), "err");
+}
+
+TEST_F(ProcessTest, OutputWrittenInPiecesByOneAndBySeveralProcessesIsWhole) {
+  EXPECT_EQ(captureShell("printf one; /bin/echo -n two; printf three; (printf four)").out, "onetwothreefour");
+}
+
+class ExitStatusTest : public ScratchHome, public ::testing::WithParamInterface<int> {};
+
+TEST_P(ExitStatusTest, IsHandedBackWhileTheRunSucceeds) {
+  const CapturedRun result = captureShell("exit " + std::to_string(GetParam()));
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, GetParam());
+}
+
+INSTANTIATE_TEST_SUITE_P(SmallToLargest, ExitStatusTest, ::testing::Values(0, 1, 3, 127, 128, 255));
+
+TEST_F(ProcessTest, ProgramEndedByASignalCountsAsStatusZero) {
+  const CapturedRun result = captureShell("echo alive; kill -KILL $$");
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, 0);
+  EXPECT_EQ(result.out, "alive\n");
+}
+
+TEST_F(ProcessTest, MissingProgramEndsWithItsErrorNumberAsStatus) {
+  const CapturedRun result = capture({"/no/such/program", "argument"});
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, 2);
+  EXPECT_EQ(result.out, "");
+  EXPECT_EQ(result.err, "");
+  EXPECT_EQ(logLines(),
+            (LogLines{processTrace("runCommand entry"), processTrace("cmdArray[0]: /no/such/program"),
+                      processTrace("cmdArray[1]: argument"),
+                      processError("error calling execvp = 2: No such file or directory"),
+                      processTrace("runCommand exit")}));
+}
+
+TEST_F(ProcessTest, ProgramMissingOnTheSearchPathEndsTheSameWay) {
+  setenv("PATH", (home() + "nowhere").c_str(), 1);
+  EXPECT_EQ(capture({"no-such-program-at-all"}).rc, 2);
+}
+
+TEST_F(ProcessTest, FileWithoutExecutePermissionEndsWithStatus13) {
+  const std::string script = write("script.sh", "#!/bin/sh\nexit 0\n", 0644);
+  const CapturedRun result = capture({script});
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, 13);
+  EXPECT_EQ(logLines()[2], processError("error calling execvp = 13: Permission denied"));
+}
+
+TEST_F(ProcessTest, CommandWithBlanksIsOneProgramName) {
+  const CapturedRun result = capture({"/bin/echo hello"});
+  EXPECT_EQ(result.rc, 2);
+  EXPECT_EQ(result.out, "");
+}
+
+TEST_F(ProcessTest, NothingIsExpandedForThereIsNoShell) {
+  EXPECT_EQ(capture({"echo", "$HOME", "*", "a;b", "'q'"}).out, "$HOME * a;b 'q'\n");
+}
+
+TEST_F(ProcessTest, ProgramIsLookedUpOnTheSearchPath) {
+  write("tools/quill-tool", "#!/bin/sh\necho found $1\n", 0755);
+  setenv("PATH", (home() + "tools").c_str(), 1);
+  EXPECT_EQ(capture({"quill-tool", "here"}).out, "found here\n");
+}
+
+TEST_F(ProcessTest, UnflushedOutputOfTheCallerIsNotRepeatedByAChildThatCannotExecute) {
+  std::string out;
+  ArgumentVector argv({"/no/such/program"});
+  CaptureStdout();
+  std::printf("before ");
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, &out, nullptr));
+  EXPECT_EQ(GetCapturedStdout(), "before ");
+  EXPECT_EQ(out, "");
+}
+
+TEST_F(ProcessTest, PrintedOutputStandsAfterWhatTheCallerPrintedBefore) {
+  ArgumentVector argv({"echo", "child"});
+  CaptureStdout();
+  std::printf("before ");
+  EXPECT_TRUE(runCommand(argv.get(), nullptr, nullptr, nullptr));
+  std::printf("after");
+  EXPECT_EQ(GetCapturedStdout(), "before child\nafter");
+}
+
+TEST_F(ProcessTest, EnvironmentAndDirectoryAreInherited) {
+  setenv("QUILL_TEST_VALUE", "inherited", 1);
+  makeDirectory("work");
+  std::filesystem::current_path(home() + "work");
+  const CapturedRun result = captureShell("echo $QUILL_TEST_VALUE; echo $QUILLHOME; /bin/pwd");
+  unsetenv("QUILL_TEST_VALUE");
+  EXPECT_EQ(result.out, "inherited\n" + home() + "\n" + home() + "work\n");
+}
+
+TEST_F(ProcessTest, StandardInputIsInherited) {
+  const std::string path = write("input", "from the caller\n");
+  const int before = dup(STDIN_FILENO);
+  const int input = open(path.c_str(), O_RDONLY | O_CLOEXEC);
+  dup2(input, STDIN_FILENO);
+  const CapturedRun result = capture({"cat"});
+  dup2(before, STDIN_FILENO);
+  close(before);
+  close(input);
+  EXPECT_EQ(result.out, "from the caller\n");
+}
+
+TEST_F(ProcessTest, OtherDescriptorsAreInherited) {
+  const std::string path = write("shared", "");
+  const int shared = open(path.c_str(), O_WRONLY);
+  const CapturedRun result = captureShell("echo by the child >&" + std::to_string(shared));
+  close(shared);
+  EXPECT_EQ(result.rc, 0);
+  EXPECT_EQ(read(path), "by the child\n");
+}
+
+/// How often a pipe stands in a listing of descriptors.
+int descriptorsOn(const std::string &listing, const std::string &pipe) {
+  std::istringstream lines(listing);
+  int count = 0;
+  for (std::string line; std::getline(lines, line);)
+    count += line == pipe ? 1 : 0;
+  return count;
+}
+
+TEST_F(ProcessTest, ChildHasEachWriteEndTwiceAndNoReadEnd) {
+  const CapturedRun result = captureShell("readlink /proc/self/fd/1; readlink /proc/self/fd/2; "
+                                          "for d in /proc/self/fd/*; do readlink $d; done");
+  std::istringstream listing(result.out);
+  std::string outPipe;
+  std::string errPipe;
+  std::getline(listing, outPipe);
+  std::getline(listing, errPipe);
+  EXPECT_THAT(outPipe, ::testing::StartsWith("pipe:["));
+  EXPECT_THAT(errPipe, ::testing::StartsWith("pipe:["));
+  EXPECT_NE(outPipe, errPipe);
+  // The line that named the pipe itself, the stream, and the end that it was duplicated from.
+  EXPECT_EQ(descriptorsOn(result.out, outPipe), 1 + 2) << result.out;
+  EXPECT_EQ(descriptorsOn(result.out, errPipe), 1 + 2) << result.out;
+}
+
+TEST_F(ProcessTest, ManyRunsLeaveNoDescriptorOpen) {
+  const std::size_t before = openDescriptors();
+  for (int run = 0; run < 5; ++run)
+    capture({run % 2 == 0 ? "true" : "/no/such/program"});
+  EXPECT_EQ(openDescriptors(), before);
+}
+
+TEST_F(ProcessTest, CommandGivenAsWordsIsRunTheSameWay) {
+  CommandResult result;
+  EXPECT_TRUE(runCommand({"/bin/sh", "-c", "echo $1; echo $2 >&2; exit 4", "sh", "a b", "c"}, result));
+  EXPECT_EQ(result.rc, 4);
+  EXPECT_EQ(result.out, "a b\n");
+  EXPECT_EQ(result.err, "c\n");
+  EXPECT_EQ(logLines(), (LogLines{processTrace("runCommand entry"), processTrace("cmdArray[0]: /bin/sh"),
+                                  processTrace("cmdArray[1]: -c"),
+                                  processTrace("cmdArray[2]: echo $1; echo $2 >&2; exit 4"),
+                                  processTrace("cmdArray[3]: sh"), processTrace("cmdArray[4]: a b"),
+                                  processTrace("cmdArray[5]: c"), processTrace("runCommand exit")}));
+}
+
+TEST_F(ProcessTest, CreatePipesMakesTwoPipesReadEndFirst) {
+  int outPipe[2] = {-1, -1};
+  int errPipe[2] = {-1, -1};
+  EXPECT_TRUE(createPipes(outPipe, errPipe));
+  EXPECT_EQ(::write(outPipe[1], "o", 1), 1);
+  EXPECT_EQ(::write(errPipe[1], "e", 1), 1);
+  char fromOut = 0;
+  char fromErr = 0;
+  EXPECT_EQ(::read(outPipe[0], &fromOut, 1), 1);
+  EXPECT_EQ(::read(errPipe[0], &fromErr, 1), 1);
+  EXPECT_EQ(fromOut, 'o');
+  EXPECT_EQ(fromErr, 'e');
+  for (const int end : {outPipe[0], outPipe[1], errPipe[0], errPipe[1]})
+    EXPECT_EQ(close(end), 0);
+  EXPECT_EQ(logLines(), LogLines{});
+}
+
+} // namespace
