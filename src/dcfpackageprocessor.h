@@ -4,6 +4,7 @@
 // All patches are checked before the first is applied; the first failure ends the command.
 #pragma once
 
+#include <memory>
 #include <string>
 #include <vector>
 
@@ -46,7 +47,10 @@ private:
   bool loadPath(const std::string &home, PatchError *error);
   bool loadFile(const std::string &home, const File &file, PatchError *error);
   bool loadDirectory(const std::string &home, File &directory, PatchError *error);
+  bool loadEntry(const std::string &home, const File &file, PatchError *error);
   bool loadPatch(const std::string &home, const File &file, PatchError *error);
+  static bool apply(PatchProcessor &processor, PatchError *error);
+  static bool report(PatchProcessor &processor, PatchError *error);
 
   std::string path_;
   std::unique_ptr<OwnedList<PatchProcessor>> _patchProcessors;

@@ -133,8 +133,7 @@ const char *ORVComponent::instanceOption() const {
 
 std::string ORVComponent::startCommandLine(const std::string &instance) const {
   const std::string option = instance.empty() ? "" : std::string(instanceOption()) + " " + instance;
-  // KEEP(start-double-blank): without an instance two blanks stand before "start"; process lists are searched
-  // for the line as it is.
+  // KEEP(start-double-blank): without an instance two blanks stand before "start".
   return home_ + "bin/QuillAgent " + option + " start " + agentCode();
 }
 

@@ -42,6 +42,9 @@ public:
   /// when it is empty. LF and CR LF end a line. Returns 0, or readFile's error number and no lines.
   static int readFileByLines(const char *name, std::vector<std::string> &lines);
 
+  /// Puts name=value into the environment of this process and of its children.
+  static void setEnvironment(const std::string &name, const std::string &value);
+
   static bool isVEMSInstalled();                 ///< monitoring server
   static bool isVEPSInstalled(std::string arch); ///< portal server
   static bool isVEPDInstalled(std::string arch); ///< portal desktop client

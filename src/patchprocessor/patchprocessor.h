@@ -104,9 +104,25 @@ private:
   PatchFileName patchFileName() const;
   std::string tempDir() const;
   std::string sourceRoot() const;
-  bool extractMember(const char *member, PatchError *err);
-  bool runSteps(PatchError *err);
-  bool printReport(PatchError *err);
+
+  bool enterTempDir(std::string &archive, std::string &previousDirectory, PatchError *err);
+  bool runTar(const std::vector<std::string> &members, const std::string &archive, PatchError *err);
+  bool verifyPrereqs(PatchError *err);
+  bool verifyLevel(const ORVComponent &installed, PatchError *err);
+  bool verifyPrereq(const std::string &prereq, const ORVComponent &installed, PatchError *err);
+  bool hasDependents() const;
+  std::vector<std::string> dependentCodes() const;
+  void collectAll();
+  void collectListed(const std::vector<std::string> &codes);
+  bool stopAll(PatchError *err);
+  bool stopListed(const std::vector<std::string> &codes, PatchError *err);
+  bool startInstances(PatchError *err);
+  void writeResultFile(int resultCode) const;
+  bool runIfAny(const std::vector<std::string> &commands, PatchError *err);
+  bool runCommands(const std::vector<std::string> &commands, PatchError *err);
+  bool moveDirectory(File &entry, PatchError *err);
+  bool moveRegularFile(File &entry, PatchError *err);
+  bool listTree(PatchError *err);
 
   std::string patchFilePath_;
   std::string home_;
@@ -116,6 +132,9 @@ private:
 
 /// Product code of the OS agent, which has a restart rule of its own.
 extern const std::string glbOsAgentPC;
+
+/// Kind of component that a patch is for, by the target of its file name.
+ORVComponent::Type targetKind(const std::string &target);
 
 /// The installed component of a product code; null when the product is not installed.
 ORVComponent *getComponent(const std::string &code);

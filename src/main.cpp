@@ -1,0 +1,185 @@
+// The driver: checks the arguments, publishes the home, opens the log, runs one action, prints the verdict.
+#include <cerrno>
+#include <csignal>
+#include <cstdio>
+#include <cstdlib>
+#include <cstring>
+#include <memory>
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "dcfpackageprocessor.h"
+#include "logger.h"
+#include "patchdescriptor.h"
+#include "patchprocessor/patchprocessor.h"
+#include "utilities.h"
+
+#define LOG_COMPONENT "main"
+
+namespace {
+
+enum ExitStatus { UsageError = 1, BadHome = 2 };
+
+struct Arguments {
+  const char *home = nullptr;
+  const char *action = nullptr;
+  const char *path = nullptr;
+};
+
+void usage() {
+  printf("\nUsage: orvpatch -h <ORV home> [OPTIONS]\n\n"
+         "   orvpatch -h <ORV home> -i { <patch_file_directory> | <patch_file> }\n"
+         "   orvpatch -h <ORV home> -t { <patch_file_directory> | <patch_file> }\n\n"
+         "   where\n\n"
+         "   -h  Specifies the ORV installation directory\n"
+         "   -i  Specifies the path to the directory or patch file to be installed\n"
+         "   -t  Generates a report of the actions to be taken by the patch\n\n\n");
+}
+
+bool isAction(const char *word) {
+  return strcmp(word, "-vi") == 0 || strcmp(word, "-i") == 0 || strcmp(word, "-t") == 0;
+}
+
+/// Two pairs of an option and its value, in either order; false for anything else.
+bool parseArguments(int argc, char **argv, Arguments &arguments) {
+  if (argc != 5)
+    return false;
+  for (int i = 1; i < argc; i += 2) {
+    if (isAction(argv[i]) && arguments.action == nullptr) {
+      arguments.action = argv[i];
+      arguments.path = argv[i + 1];
+    } else if (strcmp(argv[i], "-h") == 0 && arguments.home == nullptr) {
+      arguments.home = argv[i + 1];
+    } else {
+      return false;
+    }
+  }
+  return arguments.home != nullptr;
+}
+
+/// Appends the "/" that every path below the home relies on and exports the home; ends the process with
+/// status 2, before there is a log, when it does not exist.
+void initializeQuillHome(std::string &home) {
+  if (home.empty() || home.back() != '/')
+    home += '/';
+  if (access(home.c_str(), F_OK) != 0) {
+    fprintf(stderr, "%s\n", NLS::getFormattedString("ERROR_ORV_HOME", home.c_str()).c_str());
+    exit(BadHome);
+  }
+  Util::setEnvironment("QUILLHOME", home);
+}
+
+void openLog(int argc, char **argv) {
+  logInit();
+  LOG_TRACE("main %s", "entry");
+  for (int i = 0; i < argc; ++i)
+    LOG_TRACE("arg[%d]: %s", i, argv[i]);
+}
+
+int installPatch(const std::string &path) {
+  LOG_TRACE("installPatch(%s) %s", path.c_str(), "entry");
+  PatchError error;
+  std::unique_ptr<DCFPackageProcessor> processor(DCFPackageProcessor::createProcessor(path, &error));
+  int status = 0;
+  if (processor == nullptr || !processor->run(&error)) {
+    fprintf(stderr, "\n%s\n\n", error.text.c_str());
+    // KEEP(record-is-status): the record's code as it is; a failure without a code ends with status 0.
+    status = error.code;
+  }
+  processor.reset();
+  LOG_TRACE("installPatch(%s) = %d", path.c_str(), status);
+  return status;
+}
+
+int testPatch(const std::string &path) {
+  // KEEP(testpatch-entry): the path is not passed to this line, which shows "entry" in the parentheses.
+  LOG_TRACE("testPatch(%s)", "entry");
+  PatchError error;
+  LOG_TRACE("Creating Package Processor object with path [%s]", path.c_str());
+  std::unique_ptr<DCFPackageProcessor> processor(DCFPackageProcessor::createProcessor(path, &error));
+  int status = 0;
+  if (processor != nullptr) {
+    if (!processor->testRun(&error)) {
+      // KEEP(testpatch-one-newline): without the empty lines that frame the texts of the other actions.
+      fprintf(stderr, "%s\n", error.text.c_str());
+      status = error.code;
+    }
+  } else if (error.code != PatchError::None) {
+    fprintf(stderr, "\n%s\n\n", error.text.c_str());
+    status = error.code;
+  } else {
+    printf("\n%s\n\n", NLS::getString("DCFPP_TEST_NO_PATCH").c_str());
+  }
+  processor.reset();
+  LOG_TRACE("testPatch(%s) = %d", path.c_str(), status);
+  return status;
+}
+
+int validatePatchFile(const std::string &path) {
+  PatchError error;
+  const std::unique_ptr<PatchDescriptor> descriptor(PatchDescriptor::parseFile(path, &error));
+  if (descriptor == nullptr) {
+    fprintf(stderr, "\n%s\n\n", error.text.c_str());
+    return error.code;
+  }
+  printf("\n%s is valid\n\n", path.c_str());
+  return 0;
+}
+
+void unit_test() {
+  patchProcessorSelfCheck();
+}
+
+int runAction(const Arguments &arguments) {
+  if (strcmp(arguments.action, "-i") == 0)
+    return installPatch(arguments.path);
+  if (strcmp(arguments.action, "-t") == 0)
+    return testPatch(arguments.path);
+  return validatePatchFile(arguments.path);
+}
+
+/// Logs and prints how the run ended; returns the exit status.
+int reportVerdict(int status) {
+  const std::string logDirectory = Util::getQuillHome() + "patchlogs/";
+  const std::string verdict = status == 0
+                                  ? NLS::getString("MAIN_SUCCESSFUL")
+                                  : NLS::getFormattedString("MAIN_NOT_SUCCESSFUL", logDirectory.c_str());
+  LOG_INFO("%s", verdict.c_str());
+  printf("\n%s\n\n", verdict.c_str());
+  LOG_TRACE("main = %d", status);
+  return status;
+}
+
+/// What a caller may have left in a state that no child process must meet: an ignored SIGCHLD would take away
+/// their exit statuses, and a closed standard descriptor would be given to the next file that is opened.
+void repairInheritedState() {
+  static_cast<void>(signal(SIGCHLD, SIG_DFL));
+  int fd = 0;
+  do
+    fd = open("/dev/null", O_RDWR);
+  while (fd >= 0 && fd <= STDERR_FILENO);
+  if (fd > STDERR_FILENO)
+    static_cast<void>(close(fd));
+}
+
+} // namespace
+
+int main(int argc, char **argv) {
+  repairInheritedState();
+  const bool selfCheck = argc == 4 && strcmp(argv[3], "-utest") == 0;
+  Arguments arguments;
+  if (!selfCheck && !parseArguments(argc, argv, arguments)) {
+    usage();
+    return UsageError;
+  }
+  std::string home = selfCheck ? argv[2] : arguments.home;
+  initializeQuillHome(home);
+  openLog(argc, argv);
+  int status = 0;
+  if (selfCheck)
+    unit_test();
+  else
+    status = runAction(arguments);
+  return reportVerdict(status);
+}

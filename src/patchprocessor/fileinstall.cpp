@@ -1,0 +1,135 @@
+// updated_files: the tree of new files, moved to the same places under the home, or listed.
+//
+// The walk starts at "." inside that tree, so that the path of every entry is relative and can be appended to
+// the home. Sub-directories come before files, both in the order in which the system lists them.
+#include "patchprocessor/patchprocessor.h"
+
+#include <algorithm>
+#include <cstdio>
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "failure.h"
+#include "filedescriptor.h"
+#include "utilities.h"
+
+#define LOG_COMPONENT "patchprocessor"
+
+namespace {
+
+/// Puts what has been extracted on disk before the first old file goes, in one call for all of it: after a
+/// power failure every file is then either the old one or the new one, never an empty one. A system that
+/// cannot do it does not keep the patch from being installed.
+void flushToDisk() {
+  const FileDescriptor directory(".", O_RDONLY | O_DIRECTORY);
+  if (directory.isOpen())
+    static_cast<void>(syncfs(directory.get()));
+}
+
+/// Visits what a directory holds, sub-directories first, up to the first visit that fails.
+template <class Visit>
+bool walk(File &directory, const Visit &visit) {
+  const std::vector<File *> &subDirectories = *directory.listSubDirectories();
+  const std::vector<File *> &files = *directory.listFiles();
+  return std::all_of(subDirectories.begin(), subDirectories.end(), visit) &&
+         std::all_of(files.begin(), files.end(), visit);
+}
+
+} // namespace
+
+std::string PatchProcessor::sourceRoot() const {
+  return Util::getTempDir(descriptor_->getProductCode()) + "/updated_files";
+}
+
+bool PatchProcessor::moveFiles(PatchError *err) {
+  LOG_TRACE("PatchProcessor::moveFiles() %s", "entry");
+  const std::string previousDirectory = Util::getCurrentDirectory();
+  const std::string source = sourceRoot();
+  if (!Util::pathExists(source)) {
+    LOG_INFO_MESSAGE("PP_NO_FILES");
+    return true;
+  }
+  if (!Util::setCurrentDirectory(source))
+    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", source.c_str());
+  LOG_INFO_MESSAGE("PP_MOVE_FILES", source.c_str(), Util::getQuillHome().c_str());
+  flushToDisk();
+  File root(".");
+  bool result = moveFile(&root, err);
+  if (!Util::setCurrentDirectory(previousDirectory))
+    result = FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", previousDirectory.c_str());
+  // KEEP(movefiles-exit-name): the result line names the operation without its "s".
+  LOG_TRACE("PatchProcessor::moveFile() = %d", result);
+  return result;
+}
+
+bool PatchProcessor::moveFile(File *entry, PatchError *err) {
+  LOG_TRACE("PatchProcessor::moveFile() %s", "entry");
+  const bool result = entry->isDirectory() ? moveDirectory(*entry, err) : moveRegularFile(*entry, err);
+  LOG_TRACE("PatchProcessor::moveFile() %s", "exit");
+  return result;
+}
+
+bool PatchProcessor::moveDirectory(File &entry, PatchError *err) {
+  const std::string path = Util::getQuillHome() + entry.getPath();
+  File target(path);
+  if (!target.exists()) {
+    LOG_INFO_MESSAGE("PP_MAKE_DIR", path.c_str());
+    if (!target.mkdir()) {
+      FAILURE(err, PatchError::CannotMakeDirectory, "ERROR_PP_MAKE_DIR", path.c_str());
+      // KEEP(mkdir-null-record): without a record the walk goes on; what cannot be moved then says so itself.
+      if (err != nullptr)
+        return false;
+    }
+  }
+  return walk(entry, [&](File *child) { return moveFile(child, err); });
+}
+
+bool PatchProcessor::moveRegularFile(File &entry, PatchError *err) {
+  const std::string source = entry.getAbsolutePath();
+  const std::string destination = Util::getQuillHome() + entry.getPath();
+  if (!entry.moveFile(destination, true))
+    return FAILURE(err, PatchError::CannotMoveFile, "ERROR_PP_MOVE_FILE", source.c_str(),
+                   destination.c_str());
+  LOG_INFO_MESSAGE("PP_MOVE_FILE", source.c_str(), entry.getPath().c_str());
+  return true;
+}
+
+bool PatchProcessor::listFiles(PatchError *err) {
+  LOG_TRACE("PatchProcessor::listFiles() %s", "entry");
+  const bool result = listTree(err);
+  printf("\n");
+  LOG_TRACE("PatchProcessor::listFiles() %s", "exit");
+  return result;
+}
+
+bool PatchProcessor::listTree(PatchError *err) {
+  const std::string previousDirectory = Util::getCurrentDirectory();
+  const std::string source = sourceRoot();
+  if (!Util::pathExists(source)) {
+    // KEEP(list-no-files-false): unlike an installation, the report of a patch without files is not a
+    // success.
+    LOG_INFO_MESSAGE("PP_NO_FILES");
+    return false;
+  }
+  if (!Util::setCurrentDirectory(source))
+    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", source.c_str());
+  const std::string heading = NLS::getString("PP_LIST_FILES");
+  LOG_INFO("%s", heading.c_str());
+  printf("\n%s\n", heading.c_str());
+  File root(".");
+  bool result = listFile(&root, err);
+  if (!Util::setCurrentDirectory(previousDirectory))
+    result = FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", previousDirectory.c_str());
+  return result;
+}
+
+bool PatchProcessor::listFile(File *entry, PatchError *err) {
+  if (entry->isDirectory())
+    return walk(*entry, [&](File *child) { return listFile(child, err); });
+  const std::string source = Util::removeDotFromPath(entry->getAbsolutePath());
+  const std::string target = Util::removeDotFromPath(Util::getQuillHome() + entry->getPath());
+  LOG_INFO("%s --> %s", source.c_str(), target.c_str());
+  printf("    %s\n", target.c_str());
+  return true;
+}

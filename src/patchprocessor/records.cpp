@@ -1,0 +1,134 @@
+// What remains of a patch: the level in the product's version file, and a line in the patch history.
+#include "patchprocessor/patchprocessor.h"
+
+#include <cerrno>
+#include <cstring>
+#include <ctime>
+
+#include <fcntl.h>
+#include <unistd.h>
+
+#include "failure.h"
+#include "filedescriptor.h"
+#include "utilities.h"
+
+#define LOG_COMPONENT "patchprocessor"
+
+namespace {
+
+/// Writes all of `text` and puts it on disk; 0 or an error number.
+int writeToDisk(FileDescriptor &file, const std::string &text) {
+  if (!file.write(text) || fsync(file.get()) != 0 || !file.close())
+    return errno;
+  return 0;
+}
+
+std::string paddedTo(std::size_t width, std::string text) {
+  if (text.size() < width)
+    text.resize(width, ' ');
+  return text;
+}
+
+std::string historyHeader() {
+  const std::string rule(80, '#');
+  return rule +
+         "\n# Norvik Veyra Monitoring Patch History File\n#\n"
+         "# Format: <Product Code> | <Architecture> | <Comp> | <Patch Name> | PASS/FAIL | <user> | <date>\n" +
+         rule + "\n";
+}
+
+/// Date and time of now in local time; empty when the system cannot tell it.
+std::string now() {
+  const time_t seconds = time(nullptr);
+  tm local = {};
+  char text[49] = "";
+  if (localtime_r(&seconds, &local) != nullptr)
+    static_cast<void>(strftime(text, sizeof text, "%m/%d/%Y %H:%M:%S", &local));
+  return text;
+}
+
+/// Suffix of the version file of a server's support for another product; null for kinds that have none.
+struct Support {
+  const char *serverCode; ///< the server itself has a version file of its own platform
+  const char *suffix;
+};
+
+const Support *supportOf(ORVComponent::Type kind) {
+  static const Support vems = {"qa", "vms.ver"};
+  static const Support veps = {"pt", "vps.ver"};
+  static const Support vepd = {"dk", "vpd.ver"};
+  switch (kind) {
+  case ORVComponent::TYPE_VEMS:
+    return &vems;
+  case ORVComponent::TYPE_VEPS:
+    return &veps;
+  case ORVComponent::TYPE_VEPD:
+    return &vepd;
+  default:
+    return nullptr;
+  }
+}
+
+} // namespace
+
+std::string getVerFileName(const PatchDescriptor *descriptor, const std::string &home,
+                           const std::string &patchFilePath) {
+  const PatchFileName fileName(File(patchFilePath).getName());
+  const ORVComponent::Type kind = targetKind(fileName.getTarget());
+  const std::string product = Util::toLower(descriptor->getProductCode());
+  const std::string code = product.empty() ? "" : product.substr(1);
+  const std::string registry = home + "registry/";
+  // KEEP(vecm-zt-file): a command-line patch updates the file of "zt", whatever its own product code.
+  if (kind == ORVComponent::TYPE_CLI)
+    return registry + "zt" + fileName.getFullPlatform() + ".ver";
+  const Support *const support = supportOf(kind);
+  if (support != nullptr && code != support->serverCode)
+    return registry + code + support->suffix;
+  return registry + code + fileName.getFullPlatform() + ".ver";
+}
+
+bool PatchProcessor::updatePatchVerFile(PatchError *err) {
+  LOG_TRACE("PatchProcessor::updatePatchVerFile() %s", "entry");
+  const std::string path = getVerFileName(descriptor_.get(), home_, patchFilePath_);
+  std::vector<std::string> lines;
+  int error = Util::readFileByLines(path.c_str(), lines);
+  if (error != 0)
+    return FAILURE(err, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(),
+                   std::to_string(error).c_str());
+  // The whole text first: nothing can fail between the truncation and the one write.
+  const std::string level = "VRMF = " + descriptor_->getVersion()->getVersionString();
+  std::string text;
+  for (const std::string &line : lines)
+    text += (line.rfind("VRMF", 0) == 0 ? level : line) + "\n";
+
+  FileDescriptor file(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC);
+  if (!file.isOpen())
+    return FAILURE(err, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(),
+                   strerror(errno));
+  // KEEP(version-write-true): a level that could not be written is logged, but does not fail the patch, whose
+  // files are all in place.
+  error = writeToDisk(file, text);
+  if (error != 0)
+    FAILURE(nullptr, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(), strerror(error));
+  LOG_TRACE("PatchProcessor::updatePatchVerFile() = %d", true);
+  return true;
+}
+
+void PatchProcessor::updatePatchRegistry(bool passed) {
+  LOG_TRACE("PatchProcessor::updatePatchRegistry() %s", "entry");
+  const PatchFileName fileName = patchFileName();
+  const std::string record = descriptor_->getProductCode() + " | " + fileName.getFullPlatform() + " | " +
+                             fileName.getTarget() + " | " + paddedTo(20, descriptor_->getPatchName()) +
+                             " | " + (passed ? "PASS" : "FAIL") + " | " + paddedTo(15, Util::getUserName()) +
+                             " | " + now() + "\n";
+  const std::string path = home_ + "patchlogs/patches.hist";
+  FileDescriptor file(path.c_str(), O_WRONLY | O_CREAT | O_APPEND);
+  int error = errno;
+  if (file.isOpen()) {
+    const bool isEmpty = lseek(file.get(), 0, SEEK_END) == 0;
+    error = writeToDisk(file, (isEmpty ? historyHeader() : "") + record);
+  }
+  if (error != 0)
+    FAILURE(nullptr, PatchError::None, "ERROR_PP_UPDATE_HIST", path.c_str(), strerror(error));
+  LOG_TRACE("PatchProcessor::updatePatchRegistry() %s", "exit");
+}
