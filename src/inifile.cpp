@@ -12,6 +12,7 @@ namespace {
 template <class Map>
 std::vector<std::string> keysOf(const Map &map) {
   std::vector<std::string> keys;
+  keys.reserve(map.size());
   for (const auto &pair : map)
     keys.push_back(pair.first);
   return keys;

@@ -1,10 +1,10 @@
 // The driver: checks the arguments, publishes the home, opens the log, runs one action, prints the verdict.
-#include <cerrno>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
-#include <cstring>
 #include <memory>
+#include <string>
+#include <vector>
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -22,9 +22,9 @@ namespace {
 enum ExitStatus { UsageError = 1, BadHome = 2 };
 
 struct Arguments {
-  const char *home = nullptr;
-  const char *action = nullptr;
-  const char *path = nullptr;
+  std::string home;
+  std::string action;
+  std::string path;
 };
 
 void usage() {
@@ -37,25 +37,21 @@ void usage() {
          "   -t  Generates a report of the actions to be taken by the patch\n\n\n");
 }
 
-bool isAction(const char *word) {
-  return strcmp(word, "-vi") == 0 || strcmp(word, "-i") == 0 || strcmp(word, "-t") == 0;
+bool isAction(const std::string &word) {
+  return word == "-vi" || word == "-i" || word == "-t";
 }
 
-/// Two pairs of an option and its value, in either order; false for anything else.
+/// Two pairs of an option and its value, the home and one action, in either order; false for anything else.
 bool parseArguments(int argc, char **argv, Arguments &arguments) {
   if (argc != 5)
     return false;
-  for (int i = 1; i < argc; i += 2) {
-    if (isAction(argv[i]) && arguments.action == nullptr) {
-      arguments.action = argv[i];
-      arguments.path = argv[i + 1];
-    } else if (strcmp(argv[i], "-h") == 0 && arguments.home == nullptr) {
-      arguments.home = argv[i + 1];
-    } else {
-      return false;
-    }
-  }
-  return arguments.home != nullptr;
+  const std::vector<std::string> words(argv, argv + argc);
+  const std::size_t home = words[1] == "-h" ? 1 : 3;
+  const std::size_t action = home == 1 ? 3 : 1;
+  if (words[home] != "-h" || !isAction(words[action]))
+    return false;
+  arguments = {words[home + 1], words[action], words[action + 1]};
+  return true;
 }
 
 /// Appends the "/" that every path below the home relies on and exports the home; ends the process with
@@ -132,9 +128,9 @@ void unit_test() {
 }
 
 int runAction(const Arguments &arguments) {
-  if (strcmp(arguments.action, "-i") == 0)
+  if (arguments.action == "-i")
     return installPatch(arguments.path);
-  if (strcmp(arguments.action, "-t") == 0)
+  if (arguments.action == "-t")
     return testPatch(arguments.path);
   return validatePatchFile(arguments.path);
 }
@@ -167,7 +163,7 @@ void repairInheritedState() {
 
 int main(int argc, char **argv) {
   repairInheritedState();
-  const bool selfCheck = argc == 4 && strcmp(argv[3], "-utest") == 0;
+  const bool selfCheck = argc == 4 && std::string(argv[3]) == "-utest";
   Arguments arguments;
   if (!selfCheck && !parseArguments(argc, argv, arguments)) {
     usage();

@@ -42,10 +42,10 @@ void addPrereq(const std::string &line, std::vector<std::string> &prereqs) {
   const std::vector<std::string> pieces = Util::tokenizeString(value, "|");
   if (value == "none") {
     LOG_TRACE("Added preReqALL value = none");
-    prereqs.push_back("none");
+    prereqs.emplace_back("none");
   } else if (pieces.empty()) {
     LOG_TRACE("preReqALL syntax unknown: Defaulting preReqALL value = none");
-    prereqs.push_back("none");
+    prereqs.emplace_back("none");
   } else {
     // KEEP(prereq-first-piece): of several alternatives only the first is kept.
     LOG_TRACE("Added preReqALL value = %s", pieces.front().c_str());

@@ -17,7 +17,7 @@ public:
 
   void append(std::unique_ptr<T> item) {
     items_.push_back(item.get());
-    item.release();
+    static_cast<void>(item.release());
   }
 
   /// The objects stay owned by the list. A caller may reorder them, but neither add nor remove any.

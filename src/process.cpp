@@ -56,7 +56,7 @@ bool makePipe(int *ends) {
     LOG_ERROR("Error duping STDOUT");
   if (dup2(pipes.err[WriteEnd], STDERR_FILENO) < 0)
     LOG_ERROR("Error duping STDERR");
-  execvp(argv[0], argv);
+  execvp(argv[0], argv); // NOLINT(clang-analyzer-core.NonNullParamChecker): the vector names its program
   const int error = errno;
   LOG_ERROR("error calling execvp = %d: %s", error, strerror(error));
   exit(error);
@@ -136,6 +136,7 @@ bool runCommand(char **argv, int *rc, std::string *out, std::string *err) {
 bool runCommand(const std::vector<std::string> &words, CommandResult &result) {
   std::vector<std::string> storage = words;
   std::vector<char *> argv;
+  argv.reserve(storage.size() + 1);
   for (std::string &word : storage)
     argv.push_back(word.data());
   argv.push_back(nullptr);

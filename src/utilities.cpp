@@ -189,8 +189,8 @@ int Util::readFileByLines(const char *name, std::vector<std::string> &lines) {
 }
 
 void Util::setEnvironment(const std::string &name, const std::string &value) {
-  // The environment keeps pointing at the strings, to the very end of the process, so they are never released;
-  // kept here, those that a later one has replaced stay reachable for whoever looks for leaks.
+  // The environment keeps pointing at the strings, to the very end of the process, so they are never
+  // released; kept here, those that a later one has replaced stay reachable for whoever looks for leaks.
   static auto *const strings = new std::vector<char *>;
   strings->push_back(strdup((name + "=" + value).c_str()));
   static_cast<void>(putenv(strings->back()));

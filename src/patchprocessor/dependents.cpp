@@ -187,7 +187,8 @@ bool PatchProcessor::stopDependents(PatchError *err) {
   const bool result = all ? stopAll(err) : stopListed(codes, err);
   if (!result)
     LOG_TRACE("stop failed, exiting method prematurely");
-  // KEEP(stop-result-line): a failure among listed products, unlike one among all agents, leaves no result line.
+  // KEEP(stop-result-line): a failure among listed products, unlike one among all agents, leaves no result
+  // line.
   if (result || all)
     LOG_TRACE("PatchProcessor::stopDependents() = %d", result);
   return result;
