@@ -141,6 +141,7 @@ int reportVerdict(int status) {
   const std::string verdict = status == 0
                                   ? NLS::getString("MAIN_SUCCESSFUL")
                                   : NLS::getFormattedString("MAIN_NOT_SUCCESSFUL", logDirectory.c_str());
+  // KEEP(verdict-at-info): a failure's verdict is information too; the error itself has been logged as one.
   LOG_INFO("%s", verdict.c_str());
   printf("\n%s\n\n", verdict.c_str());
   LOG_TRACE("main = %d", status);
