@@ -133,6 +133,13 @@ LogLine error(const std::string &component, const std::string &message) {
   return {"ERROR", component, message};
 }
 
+LogLines framed(const LogLine &entry, const LogLines &between, const LogLine &exit) {
+  LogLines lines = {entry};
+  lines.insert(lines.end(), between.begin(), between.end());
+  lines.push_back(exit);
+  return lines;
+}
+
 LogLines withoutPointers(LogLines lines) {
   static const std::regex pointer(R"(\(0x[0-9a-f]+\))");
   for (LogLine &line : lines)

@@ -66,6 +66,9 @@ LogLine trace(const std::string &component, const std::string &message);
 LogLine info(const std::string &component, const std::string &message);
 LogLine error(const std::string &component, const std::string &message);
 
+/// The lines of an operation: its entry, what it logs between, its exit.
+LogLines framed(const LogLine &entry, const LogLines &between, const LogLine &exit);
+
 /// The lines with every pointer value written as "(buffer)": where a buffer lies cannot be foretold.
 LogLines withoutPointers(LogLines lines);
 
