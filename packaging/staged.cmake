@@ -1,0 +1,13 @@
+# Run by cpack when the files of a package stand in their places.
+
+set(staged ${CPACK_TEMPORARY_DIRECTORY})
+file(GLOB program ${staged}/sbin/orvpatch ${staged}/usr/sbin/orvpatch)
+execute_process(
+  COMMAND ${CPACK_ORVPATCH_STRIP} --strip-all --remove-section=.comment --preserve-dates ${program}
+  COMMAND_ERROR_IS_FATAL ANY)
+
+# With SOURCE_DATE_EPOCH all get that time, so that it does not matter when a checkout was made.
+if(DEFINED ENV{SOURCE_DATE_EPOCH})
+  execute_process(COMMAND find ${staged} -exec touch -h -d @$ENV{SOURCE_DATE_EPOCH} {} +
+    COMMAND_ERROR_IS_FATAL ANY)
+endif()
