@@ -126,6 +126,8 @@ void File::initialize() {
   files_.reset();
   subDirectories_.reset();
 
+  // KEEP(root-unknown): exactly one "/" is left out for the look, so the root directory itself, whose name is
+  // then empty, does not exist for this class.
   const bool slash = endsInSlash(path_);
   struct stat status = {};
   if (stat((slash ? path_.substr(0, path_.size() - 1) : path_).c_str(), &status) != 0) {

@@ -9,6 +9,8 @@
 
 namespace {
 
+/// KEEP(sorted-names): ascending byte-wise order, not file order, for all that is listed from a descriptor; a
+/// name that comes twice is one.
 template <class Map>
 std::vector<std::string> keysOf(const Map &map) {
   std::vector<std::string> keys;

@@ -171,6 +171,7 @@ bool ORVComponent::stopInstance(const std::string &instance, PatchError *err) {
   return stopped;
 }
 
+// KEEP(stop-as-current-user): unlike a start, a stop goes neither through a shell nor through su.
 bool ORVComponent::stop(const std::string &instance, PatchError *err) {
   std::vector<std::string> command = {home_ + "bin/QuillAgent"};
   if (!instance.empty())
@@ -215,6 +216,7 @@ bool ORVComponent::runControl(const std::vector<std::string> &command, bool *ran
 
 bool ORVComponent::reportControlFailure(const ControlFailure &failure, const std::string &instance,
                                         bool named, PatchError *err) const {
+  // KEEP(null-record-silent): without a record the error is not logged either.
   if (err == nullptr)
     return false;
   const char *const product = descriptiveName_.c_str();

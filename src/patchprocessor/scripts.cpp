@@ -33,14 +33,17 @@ private:
   std::string oldPath_;
 };
 
-/// Replaces the code of a failed list by that of its place in the sequence; the text stays.
+/// KEEP(script-code-replaced): whatever ended a list, its place in the sequence gives the code; the text
+/// stays.
 bool withCode(PatchError::Code code, bool result, PatchError *err) {
   if (!result && err != nullptr)
     err->code = code;
   return result;
 }
 
-/// Runs one command. The whole text is the name of the program: there is no shell, and blanks are part of it.
+/// Runs one command.
+/// KEEP(command-is-program): the whole text is the name of the program; no shell reads it, blanks belong to
+/// it.
 bool runScript(const std::string &command, PatchError *err) {
   LOG_INFO_MESSAGE("PP_PROCESS_SCRIPT", command.c_str());
   CommandResult script;
