@@ -1,0 +1,47 @@
+"""Fixtures of all tests that run the real program: cases, fault tests and the tests of the support library."""
+
+import os
+
+import pytest
+
+from support import ProductHome, Program, remove_tree, scratch_folder
+
+
+def pytest_collection_modifyitems(items):
+    if os.geteuid() == 0:
+        return
+    for item in items:
+        if item.get_closest_marker("needs_root"):
+            item.add_marker(pytest.mark.skip(reason="needs root"))
+
+
+@pytest.fixture(scope="session")
+def program():
+    """The program under test; says what to do when it has not been built."""
+    found = Program()
+    if not found.binary.exists():
+        pytest.exit(f"{found.binary} is missing: cmake --preset dev && cmake --build --preset dev", returncode=2)
+    return found
+
+
+@pytest.fixture
+def home():
+    """A product home with nothing installed and nothing running; its processes end with the test."""
+    with ProductHome() as made:
+        yield made
+
+
+@pytest.fixture
+def scratch():
+    """A temporary folder that other users may enter, unlike pytest's own."""
+    folder = scratch_folder()
+    yield folder
+    remove_tree(folder)
+
+
+@pytest.fixture
+def patch_dir(scratch):
+    """An empty folder for patch files."""
+    folder = scratch / "patches"
+    folder.mkdir()
+    return folder

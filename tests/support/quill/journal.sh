@@ -1,0 +1,31 @@
+# Sourced by the sample product's control scripts and by the scripts of sample patches. The caller sets
+# quill_home, the home without a trailing "/".
+
+# journal PROGRAM ARGUMENT...
+# Appends one line to the home's journal: program, user, directory, PATH, QUILLHOME, arguments, separated by
+# the unit separator, which occurs in none of them. Saves a copy of every watched file beside it, so that
+# a reader can tell what was in place at the moment of the call.
+journal() {
+  [ -z "${QUILL_UNJOURNALED-}" ] || return 0
+  us=$(printf '\037')
+  line="$1$us$(id -un)$us$(pwd)$us$PATH$us${QUILLHOME-}"
+  shift
+  for argument in "$@"; do
+    line="$line$us$argument"
+  done
+  printf '%s\n' "$line" >>"$quill_home/journal"
+  save_watched
+}
+
+# save_watched: copies the files listed in control/watch to control/seen/<line of the journal>/.
+save_watched() {
+  [ -s "$quill_home/control/watch" ] || return 0
+  seen="$quill_home/control/seen/$(wc -l <"$quill_home/journal" | tr -d ' ')"
+  mkdir -p "$seen"
+  while IFS= read -r watched; do
+    if [ -f "$quill_home/$watched" ]; then
+      mkdir -p "$(dirname "$seen/$watched")"
+      cp -p "$quill_home/$watched" "$seen/$watched"
+    fi
+  done <"$quill_home/control/watch"
+}

@@ -1,0 +1,108 @@
+# Sourced by QuillAgent and QuillServer: starts and stops the process of one instance and keeps the run
+# information true. The caller sets quill_home, the home without a trailing "/".
+
+run_info="$quill_home/config/.ConfigData/RunInfo"
+
+die() { # STATUS MESSAGE
+  printf '%s\n' "$2" >&2
+  exit "$1"
+}
+
+# spawn FILE: starts a process that lives until it is killed and names FILE in its command line; prints its
+# process id and that of its keeper. The keeper is the parent that reaps it, for a dead process that nobody
+# reaps still shows in ps. Neither holds a descriptor of the caller (a pipe, above all) or its directory; it
+# takes bash to close descriptors of two digits.
+spawn() {
+  # shellcheck disable=SC2016
+  setsid bash -c '
+    for fd in /proc/self/fd/*; do
+      [ "${fd##*/}" -le 2 ] || eval "exec ${fd##*/}>&-"
+    done
+    cd /
+    tail -f "$1" </dev/null >/dev/null 2>&1 &
+    echo "$! $$"
+    exec </dev/null >/dev/null 2>&1
+    wait' keeper "$1" </dev/null 2>/dev/null &
+}
+
+field_separator() { sed -n '1s/^[^=]*=//p' "$run_info"; }
+
+# recorded_name CODE INSTANCE: the instance as the run information holds it.
+recorded_name() {
+  case "$1/$2" in
+    */) echo None ;;
+    xe/*) echo "$(uname -n | cut -d. -f1)_$2" ;;
+    *) printf '%s\n' "$2" ;;
+  esac
+}
+
+# recorded_pid CODE NAME: the process id of the first matching row; nothing when there is none.
+recorded_pid() {
+  while IFS=$(field_separator) read -r _ row_code row_pid row_name _; do
+    if [ "$row_code" = "$1" ] && [ "$row_name" = "$2" ]; then
+      echo "$row_pid"
+      return
+    fi
+  done <"$run_info"
+}
+
+is_alive() { [ -n "$1" ] && [ -d "/proc/$1" ]; }
+
+# start_instance CODE INSTANCE
+start_instance() {
+  name=$(recorded_name "$1" "$2")
+  pid=$(recorded_pid "$1" "$name")
+  if is_alive "$pid"; then
+    return 0
+  fi
+  file="$quill_home/control/processes/$1.$(printf %s "$name" | tr / _)"
+  [ -e "$file" ] || : >"$file"
+  pids=$(spawn "$file")
+  echo "$pids" >>"$quill_home/control/started"
+  sep=$(field_separator)
+  printf '%s\n' "$(uname -n)$sep$1$sep${pids% *}$sep$name$sep$(id -un)" >>"$run_info"
+}
+
+# stop_instance CODE INSTANCE
+stop_instance() {
+  name=$(recorded_name "$1" "$2")
+  pid=$(recorded_pid "$1" "$name")
+  is_alive "$pid" || die 1 "not running: $1 $2"
+  kill "$pid" || die 1 "cannot stop process $pid"
+  await_end "$pid" || die 1 "process $pid does not end"
+  sep=$(field_separator)
+  rows=$(grep -v -F -e "$sep$1$sep$pid$sep" "$run_info")
+  printf '%s\n' "$rows" >"$run_info" # in place: the file keeps its owner and mode
+}
+
+await_end() { # PID
+  attempts=250
+  while is_alive "$1"; do
+    attempts=$((attempts - 1))
+    [ "$attempts" -gt 0 ] || return 1
+    sleep 0.02
+  done
+}
+
+# switch_of VERB CODE INSTANCE: the folder under control/ that tells how this call shall behave, if any.
+switch_of() {
+  named="$quill_home/control/$1-$2-$(printf %s "${3:-None}" | tr / _)"
+  if [ -d "$named" ]; then
+    echo "$named"
+  elif [ -d "$quill_home/control/$1-$2" ]; then
+    echo "$quill_home/control/$1-$2"
+  fi
+}
+
+# perform VERB CODE INSTANCE: does what was asked for, or what a switch has ordered instead.
+perform() {
+  switch=$(switch_of "$@")
+  if [ -z "$switch" ]; then
+    "$1_instance" "$2" "$3"
+    exit
+  fi
+  cat "$switch/out"
+  cat "$switch/err" >&2
+  [ ! -e "$switch/effective" ] || "$1_instance" "$2" "$3"
+  exit "$(cat "$switch/status")"
+}
