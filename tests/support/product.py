@@ -242,14 +242,13 @@ class ProductHome:
         """Ends every process that was ever started in this home."""
         if not self.exists("control/started"):
             return
-        for sign in (signal.SIGKILL, None):
-            for pid in map(int, self.read("control/started").split()):
-                if not self._is_ours(pid):
-                    continue
-                if sign:
-                    os.kill(pid, sign)
-                else:
-                    _await_end(pid)
+        # Keepers are left alone: each ends as soon as it has reaped its process.
+        pids = [int(line.split()[0]) for line in self.read("control/started").splitlines()]
+        living = [pid for pid in pids if self._is_ours(pid)]
+        for pid in living:
+            os.kill(pid, signal.SIGKILL)
+        for pid in living:
+            _await_end(pid)
 
     def close(self):
         """Ends all processes and removes the scratch folder, if this object made one."""
