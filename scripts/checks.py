@@ -169,7 +169,7 @@ def chosen_stages(options):
     if options.fuzz:
         stages += fuzz_stages(options.fuzz)
     if options.coverage:
-        stages.append(Stage("coverage", [["tests/coverage"]]))
+        stages.append(Stage("coverage", [["tests/coverage/run"]]))
     if options.mutate:
         stages.append(Stage("mutate", [["tests/mutate/run", str(options.mutate)]]))
     if options.quick or not stages:
