@@ -61,7 +61,7 @@ def bash(line, folder):
 
 
 def zsh(line, folder):
-    offered = ask(["zsh", "-f", CHECKOUT / "tests/packaging/complete.zsh", COMPLETIONS, line], folder)
+    offered = ask(["zsh", "-f", CHECKOUT / "tests/completions/complete.zsh", COMPLETIONS, line], folder)
     return [name.replace("\\ ", " ") for name in offered]
 
 
