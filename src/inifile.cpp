@@ -57,7 +57,7 @@ IniFile *IniFile::parseFile(const std::string &path, PatchError *err) {
   auto file = std::make_unique<IniFile>(path);
   if (!file->parse(err)) {
     // The record keeps the cause that parse has put there.
-    FAILURE(nullptr, PatchError::None, "ERROR_INIFILE_PARSE", path.c_str());
+    LOG_ERROR_MESSAGE("ERROR_INIFILE_PARSE", path.c_str());
     file.reset();
   }
   LOG_TRACE("IniFile::parse(%s) %s", path.c_str(), "exit");

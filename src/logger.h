@@ -38,5 +38,6 @@ void logMsg(logger_level level, const char *component, const char *format, va_li
 #define LOG_INFO(...) (setLine(__LINE__), logInfo(LOG_COMPONENT, __VA_ARGS__))
 #define LOG_TRACE(...) (setLine(__LINE__), logTrace(LOG_COMPONENT, __VA_ARGS__))
 
-/// Logs a catalogue text at information level: its key and its arguments.
+// Catalogue texts: the key and its arguments. A failure that fills a record is reported with FAILURE instead.
+#define LOG_ERROR_MESSAGE(...) LOG_ERROR("%s", NLS::getFormattedString(__VA_ARGS__).c_str())
 #define LOG_INFO_MESSAGE(...) LOG_INFO("%s", NLS::getFormattedString(__VA_ARGS__).c_str())

@@ -149,10 +149,12 @@ int reportVerdict(int status) {
   return status;
 }
 
-/// What a caller may have left in a state that no child process must meet: an ignored SIGCHLD would take away
-/// their exit statuses, and a closed standard descriptor would be given to the next file that is opened.
+/// What a caller may have left in a state that this process must not work in: an ignored SIGCHLD would take
+/// away the children's exit statuses, and a closed standard descriptor would be given to the next file that
+/// is opened. And a reader that goes away must not end an installation in its middle.
 void repairInheritedState() {
   static_cast<void>(signal(SIGCHLD, SIG_DFL));
+  static_cast<void>(signal(SIGPIPE, SIG_IGN));
   int fd = 0;
   do
     fd = open("/dev/null", O_RDWR);

@@ -45,7 +45,7 @@ PatchDescriptor *PatchDescriptor::parseFile(const std::string &path, PatchError 
   auto descriptor = std::make_unique<PatchDescriptor>();
   if (!descriptor->parse(ini.get(), err)) {
     // The record keeps what the section builders have put there.
-    FAILURE(nullptr, PatchError::None, "ERROR_PATCH_PARSE");
+    LOG_ERROR_MESSAGE("ERROR_PATCH_PARSE");
     descriptor.reset();
   }
   ini.reset();

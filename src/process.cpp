@@ -1,6 +1,7 @@
 #include "process.h"
 
 #include <cerrno>
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <cstring>
@@ -56,6 +57,7 @@ bool makePipe(int *ends) {
     LOG_ERROR("Error duping STDOUT");
   if (dup2(pipes.err[WriteEnd], STDERR_FILENO) < 0)
     LOG_ERROR("Error duping STDERR");
+  static_cast<void>(signal(SIGPIPE, SIG_DFL)); // which the driver ignores for itself alone
   execvp(argv[0], argv); // NOLINT(clang-analyzer-core.NonNullParamChecker): the vector names its program
   const int error = errno;
   LOG_ERROR("error calling execvp = %d: %s", error, strerror(error));

@@ -40,8 +40,9 @@ bool isActive(const char *code) {
 /// record gets the code alone.
 /// KEEP(running-empty-text): the driver later prints the empty text.
 bool refuseRunning(PatchError *err, PatchError::Code code, const char *key, const std::string &patchFile) {
-  FAILURE(nullptr, code, key, patchFile.c_str());
-  fprintf(stderr, "\n\n%s\n", NLS::getFormattedString(key, patchFile.c_str()).c_str());
+  const std::string message = NLS::getFormattedString(key, patchFile.c_str());
+  LOG_ERROR("%s", message.c_str());
+  fprintf(stderr, "\n\n%s\n", message.c_str());
   fillRecord(err, code, "");
   return false;
 }

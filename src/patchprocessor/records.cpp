@@ -109,7 +109,7 @@ bool PatchProcessor::updatePatchVerFile(PatchError *err) {
   // files are all in place.
   error = writeToDisk(file, text);
   if (error != 0)
-    FAILURE(nullptr, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(), strerror(error));
+    LOG_ERROR_MESSAGE("ERROR_PP_UPDATE_VRMF", path.c_str(), strerror(error));
   LOG_TRACE("PatchProcessor::updatePatchVerFile() = %d", true);
   return true;
 }
@@ -129,6 +129,6 @@ void PatchProcessor::updatePatchRegistry(bool passed) {
     error = writeToDisk(file, (isEmpty ? historyHeader() : "") + record);
   }
   if (error != 0)
-    FAILURE(nullptr, PatchError::None, "ERROR_PP_UPDATE_HIST", path.c_str(), strerror(error));
+    LOG_ERROR_MESSAGE("ERROR_PP_UPDATE_HIST", path.c_str(), strerror(error));
   LOG_TRACE("PatchProcessor::updatePatchRegistry() %s", "exit");
 }
