@@ -73,7 +73,7 @@ TEST_F(FileMoveTest, DeletedFileIsGoneButItsObjectStillSaysItExists) {
   File file(writeSource());
   EXPECT_TRUE(file.deleteFile());
   EXPECT_FALSE(isThere(source()));
-  EXPECT_TRUE(file.exists());
+  EXPECT_TRUE(file.exists()); // KEEP(delete-inverted-exists)
   EXPECT_EQ(logLines(), LogLines{});
 }
 
@@ -82,7 +82,7 @@ TEST_F(FileMoveTest, FileThatCannotBeDeletedIsSaidToBeGone) {
   fs::remove(source());
   EXPECT_FALSE(file.deleteFile());
   EXPECT_FALSE(file.exists());
-  EXPECT_EQ(logLines(), LogLines{notDeleted(source())});
+  EXPECT_EQ(logLines(), LogLines{notDeleted(source())}); // KEEP(delete-error-text)
 }
 
 TEST_F(FileMoveTest, SecondDeletionFailsAndSetsTheFlagRight) {
@@ -218,7 +218,7 @@ TEST_F(FileMoveTest, OwnerOfAFileWithANewNameIsItsOwn) {
 TEST_F(FileMoveTest, MissingSourceCountsAsMovedAndChangesNothing) {
   File file(source());
   writeTarget(0640);
-  EXPECT_TRUE(file.moveFile(target(), true));
+  EXPECT_TRUE(file.moveFile(target(), true)); // KEEP(move-missing-source)
   EXPECT_EQ(read(target()), "old");
   EXPECT_EQ(modeOf(target()), 0640U);
   EXPECT_EQ(file.getPath(), source());
@@ -333,7 +333,7 @@ TEST_F(FileMoveTest, CopyReplacesAnExistingTargetThatNeedNotBeKept) {
 TEST_F(FileMoveTest, CopyOntoAnExistingTargetThatMustBeKeptFails) {
   File file(writeSource());
   writeTarget();
-  EXPECT_FALSE(file.copyFile(target(), true));
+  EXPECT_FALSE(file.copyFile(target(), true)); // KEEP(copy-flag-sense)
   EXPECT_EQ(read(source()), "new");
   EXPECT_EQ(read(target()), "old");
   EXPECT_EQ(logLines(), copied({notLinked(source(), target(), "File exists")}));

@@ -164,7 +164,7 @@ TEST_F(MkdirTest, DanglingLinkInTheWayFails) {
 
 TEST_F(MkdirTest, FailureOfAnObjectThatExistedIsStillTrue) {
   File file(write("file", ""));
-  EXPECT_TRUE(file.mkdir());
+  EXPECT_TRUE(file.mkdir()); // KEEP(mkdir-known-existence)
   EXPECT_TRUE(file.isFile());
   EXPECT_FALSE(file.isDirectory());
   EXPECT_EQ(file.getPath(), home() + "file");

@@ -118,7 +118,8 @@ INSTANTIATE_TEST_SUITE_P(
         ParsedFile{"BlankLinesBeforeTheFirstHeader", "\n \t \n\r\n[A]\nk=v\n", {{"A", {{"k", "v"}}}}},
         ParsedFile{"EmptySection", "[A]\n[B]\n", {{"A", {}}, {"B", {}}}},
         ParsedFile{"BlanksAroundAndInside", "  [ \t A B \t]\t\r\nk=v", {{"A B", {{"k", "v"}}}}},
-        ParsedFile{"WithoutItsBracket", "[abc\nk=v\n", {{"ab", {{"k", "v"}}}}},
+        ParsedFile{
+            "WithoutItsBracket", "[abc\nk=v\n", {{"ab", {{"k", "v"}}}}}, // KEEP(section-last-character)
         ParsedFile{"TextBehindTheBracket", "[abc] x\n", {{"abc]", {}}}},
         ParsedFile{"CommentBehindTheBracket", "[abc] # x\n", {{"abc] #", {}}}},
         ParsedFile{"EmptyName", "[]\nk=v\n", {{"", {{"k", "v"}}}}},
@@ -127,7 +128,7 @@ INSTANTIATE_TEST_SUITE_P(
         ParsedFile{"EqualSignInTheName", "[a=b]\n", {{"a=b", {}}}},
         ParsedFile{"BracketInTheName", "[[a]]\n", {{"[a]", {}}}},
         ParsedFile{"NamesDifferInCase", "[a]\nk=1\n[A]\nk=2\n", {{"a", {{"k", "1"}}}, {"A", {{"k", "2"}}}}},
-        ParsedFile{"RepeatedHeaderDiscardsTheEarlierEntries",
+        ParsedFile{"RepeatedHeaderDiscardsTheEarlierEntries", // KEEP(section-replaced)
                    "[S]\na=1\nb=2\n[T]\nc=3\n[S]\nd=4\n",
                    {{"S", {{"d", "4"}}}, {"T", {{"c", "3"}}}}},
         ParsedFile{"RepeatedHeaderThatDiffersInBlanksOnly", "[S]\na=1\n[ S ]\n", {{"S", {}}}},
@@ -168,7 +169,7 @@ INSTANTIATE_TEST_SUITE_P(
 TEST_F(IniFileTest, NamesComeBackSortedByTheirBytes) {
   const auto ini = parse("[zz]\n[a]\n[Z]\n[\xe4]\n[10]\n[9]\n");
   ASSERT_NE(ini, nullptr);
-  EXPECT_EQ(ini->getSectionNames(), (Names{"10", "9", "Z", "a", "zz", "\xe4"}));
+  EXPECT_EQ(ini->getSectionNames(), (Names{"10", "9", "Z", "a", "zz", "\xe4"})); // KEEP(sorted-names)
 }
 
 TEST_F(IniFileTest, EntryNamesComeBackSortedByTheirBytes) {
@@ -197,7 +198,7 @@ TEST_F(IniFileTest, StrayLineLeavesCode4InARecordOfASuccess) {
   const auto ini = parse("x = 1\n[A]\nk=v\n");
   ASSERT_NE(ini, nullptr);
   EXPECT_EQ(sectionsOf(*ini), (Sections{{"A", {{"k", "v"}}}}));
-  EXPECT_EQ(err_.code, 4);
+  EXPECT_EQ(err_.code, 4); // KEEP(stray-entry)
   EXPECT_EQ(err_.text, "Properites start before section definition");
   EXPECT_EQ(logLinesOf("inifile.cpp"),
             parseFileTraces({Parsing, StrayLine, iniTrace("Created section: A"), Parsing}));

@@ -177,23 +177,24 @@ TEST_P(ReadFileByLinesTest, YieldsTheLinesThatAreNotEmpty) {
 
 INSTANTIATE_TEST_SUITE_P(
     Files, ReadFileByLinesTest,
-    ::testing::Values(FileOfLines{"FinalTerminatorAddsAnEmptyOne", "a\nb\n", {"a", "b", ""}},
-                      FileOfLines{"NoFinalTerminator", "a\nb", {"a", "b"}},
-                      FileOfLines{"CarriageReturnLineFeed", "a\r\nb\r\n", {"a", "b", ""}},
-                      FileOfLines{"BothKindsMixed", "a\r\nb\nc\r\nd", {"a", "b", "c", "d"}},
-                      FileOfLines{"BlankLinesVanish", "a\n\n\r\n\nb\n", {"a", "b", ""}},
-                      FileOfLines{"LeadingBlankLinesVanish", "\n\r\na", {"a"}},
-                      FileOfLines{"LinesOfBlanksStay", "a\n \n\t\nb", {"a", " ", "\t", "b"}},
-                      FileOfLines{"Empty", "", {""}}, FileOfLines{"OnlyATerminator", "\n", {""}},
-                      FileOfLines{"OnlyTerminators", "\n\r\n\n", {""}},
-                      FileOfLines{"LoneCarriageReturnIsText", "a\rb\nc", {"a\rb", "c"}},
-                      FileOfLines{"LastOfTwoCarriageReturnsEndsTheLine", "a\r\r\nb", {"a\r", "b"}},
-                      FileOfLines{"FinalCarriageReturnIsText", "a\nb\r", {"a", "b\r"}},
-                      FileOfLines{"LineFeedCarriageReturn", "a\n\rb", {"a", "\rb"}},
-                      FileOfLines{"NulEndsTheText", std::string("a\nb\0c\nd\n", 8), {"a", "b"}},
-                      FileOfLines{"NulAfterATerminator", std::string("a\n\0b\n", 5), {"a", ""}},
-                      FileOfLines{"NulFirst", std::string("\0a\n", 3), {""}},
-                      FileOfLines{"NulBetweenCarriageReturnAndLineFeed", std::string("a\r\0\n", 4), {"a\r"}}),
+    ::testing::Values(
+        FileOfLines{"FinalTerminatorAddsAnEmptyOne", "a\nb\n", {"a", "b", ""}}, // KEEP(final-empty-line)
+        FileOfLines{"NoFinalTerminator", "a\nb", {"a", "b"}},
+        FileOfLines{"CarriageReturnLineFeed", "a\r\nb\r\n", {"a", "b", ""}},
+        FileOfLines{"BothKindsMixed", "a\r\nb\nc\r\nd", {"a", "b", "c", "d"}},
+        FileOfLines{"BlankLinesVanish", "a\n\n\r\n\nb\n", {"a", "b", ""}},
+        FileOfLines{"LeadingBlankLinesVanish", "\n\r\na", {"a"}},
+        FileOfLines{"LinesOfBlanksStay", "a\n \n\t\nb", {"a", " ", "\t", "b"}},
+        FileOfLines{"Empty", "", {""}}, FileOfLines{"OnlyATerminator", "\n", {""}},
+        FileOfLines{"OnlyTerminators", "\n\r\n\n", {""}},
+        FileOfLines{"LoneCarriageReturnIsText", "a\rb\nc", {"a\rb", "c"}},
+        FileOfLines{"LastOfTwoCarriageReturnsEndsTheLine", "a\r\r\nb", {"a\r", "b"}},
+        FileOfLines{"FinalCarriageReturnIsText", "a\nb\r", {"a", "b\r"}},
+        FileOfLines{"LineFeedCarriageReturn", "a\n\rb", {"a", "\rb"}},
+        FileOfLines{"NulEndsTheText", std::string("a\nb\0c\nd\n", 8), {"a", "b"}},
+        FileOfLines{"NulAfterATerminator", std::string("a\n\0b\n", 5), {"a", ""}},
+        FileOfLines{"NulFirst", std::string("\0a\n", 3), {""}},
+        FileOfLines{"NulBetweenCarriageReturnAndLineFeed", std::string("a\r\0\n", 4), {"a\r"}}),
     [](const auto &file) { return file.param.name; });
 
 class ReadLinesTest : public ScratchHome {

@@ -1,0 +1,37 @@
+# The calls that have a stand-in in support/systemcalls.cpp; a new one is added in both places.
+set(wrapped_calls
+  access
+  chdir
+  chmod
+  chown
+  close
+  dup2
+  execvp
+  fork
+  getcwd
+  getpwuid
+  getuid
+  link
+  localtime
+  localtime_r
+  lseek
+  malloc
+  mkdir
+  open
+  opendir
+  pipe
+  read
+  readdir
+  rmdir
+  stat
+  uname
+  unlink
+  wait
+  write)
+list(TRANSFORM wrapped_calls PREPEND "LINKER:--wrap=" OUTPUT_VARIABLE wrap_options)
+
+add_executable(wrapped_tests ${wrapped_tests} ${support} support/systemcalls.cpp)
+target_include_directories(wrapped_tests PRIVATE support)
+target_link_libraries(wrapped_tests PRIVATE orvpatch_core GTest::gmock GTest::gtest_main)
+target_link_options(wrapped_tests PRIVATE ${wrap_options})
+target_precompile_headers(wrapped_tests REUSE_FROM unit_tests)
