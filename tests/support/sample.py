@@ -47,8 +47,12 @@ class Sample:
         ]
 
     def levels(self):
-        """Level and files of every component."""
+        """The level of every component."""
         return [f"{desc}: {self.home.level(code)}" for code, desc in _COMPONENTS.items()]
+
+    def calls(self):
+        """Every call of a control script or a patch script so far."""
+        return self.home.calls()
 
     def _make_fixpack(self):
         folder = self.root / "fixpack2"
