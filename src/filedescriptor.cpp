@@ -5,7 +5,10 @@
 #include <fcntl.h>
 #include <unistd.h>
 
-FileDescriptor::FileDescriptor(const char *path, int flags) : fd_(open(path, flags | O_CLOEXEC, 0666)) {}
+// O_NONBLOCK: a pipe that stands in a file's place fails to open, where it would be waited on for ever. Files
+// and directories do not know the flag.
+FileDescriptor::FileDescriptor(const char *path, int flags)
+    : fd_(open(path, flags | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666)) {}
 
 FileDescriptor::~FileDescriptor() {
   close();

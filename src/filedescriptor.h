@@ -7,7 +7,8 @@
 
 class FileDescriptor {
 public:
-  /// Opens `path` with `flags` (O_CLOEXEC is added) and, for a new file, mode 0666 less the umask.
+  /// Opens `path` with `flags`, never waiting, not passed on to children, and, for a new file, mode 0666 less
+  /// the umask.
   FileDescriptor(const char *path, int flags);
   FileDescriptor(const FileDescriptor &) = delete;
   FileDescriptor &operator=(const FileDescriptor &) = delete;

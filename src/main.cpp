@@ -13,6 +13,7 @@
 #include "logger.h"
 #include "patchdescriptor.h"
 #include "patchprocessor/patchprocessor.h"
+#include "process.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "main"
@@ -151,10 +152,11 @@ int reportVerdict(int status) {
 
 /// What a caller may have left in a state that this process must not work in: an ignored SIGCHLD would take
 /// away the children's exit statuses, and a closed standard descriptor would be given to the next file that
-/// is opened. And a reader that goes away must not end an installation in its middle.
+/// is opened. And a reader that goes away, or a limit on the size of files, must not end an installation in
+/// its middle.
 void repairInheritedState() {
   static_cast<void>(signal(SIGCHLD, SIG_DFL));
-  static_cast<void>(signal(SIGPIPE, SIG_IGN));
+  setWriteSignals(SIG_IGN);
   int fd = 0;
   do
     fd = open("/dev/null", O_RDWR);

@@ -57,7 +57,7 @@ bool makePipe(int *ends) {
     LOG_ERROR("Error duping STDOUT");
   if (dup2(pipes.err[WriteEnd], STDERR_FILENO) < 0)
     LOG_ERROR("Error duping STDERR");
-  static_cast<void>(signal(SIGPIPE, SIG_DFL)); // which the driver ignores for itself alone
+  setWriteSignals(SIG_DFL);
   execvp(argv[0], argv); // NOLINT(clang-analyzer-core.NonNullParamChecker): the vector names its program
   const int error = errno;
   LOG_ERROR("error calling execvp = %d: %s", error, strerror(error));
@@ -91,6 +91,11 @@ void deliver(const std::string &output, std::string *destination, FILE *stream) 
 }
 
 } // namespace
+
+void setWriteSignals(void (*disposition)(int)) {
+  for (const int number : {SIGPIPE, SIGXFSZ})
+    static_cast<void>(signal(number, disposition));
+}
 
 bool createPipes(int *outPipe, int *errPipe) {
   // KEEP(pipes-always-true): a missing pipe costs the child's output, not the run.

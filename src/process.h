@@ -27,6 +27,10 @@ struct CommandResult {
 /// The same for a command given as its words, with both streams captured.
 bool runCommand(const std::vector<std::string> &words, CommandResult &result);
 
+/// Sets the disposition of the signals that a write may raise: SIG_IGN for the tool, so that a log that
+/// nobody takes ends no run; children get SIG_DFL.
+void setWriteSignals(void (*disposition)(int));
+
 /// Makes the two pipes, read end first. A pipe that cannot be made is logged and its ends are -1; the result
 /// is true all the same.
 bool createPipes(int *outPipe, int *errPipe);

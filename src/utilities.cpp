@@ -39,7 +39,8 @@ ssize_t readUpTo(const FileDescriptor &file, char *buffer, std::size_t size) {
 /// The whole content of an open file as a new NUL-terminated buffer; 0 or an error number.
 int readContent(const FileDescriptor &file, const char *name, char **buffer) {
   const off_t size = lseek(file.get(), 0, SEEK_END);
-  if (size < 0 || size == INT_MAX || lseek(file.get(), 0, SEEK_SET) != 0)
+  // The limit of a 32-bit size: nothing that the product reads whole comes near it.
+  if (size < 0 || size >= INT_MAX || lseek(file.get(), 0, SEEK_SET) != 0)
     return EINVAL;
   const auto capacity = static_cast<std::size_t>(size);
   std::unique_ptr<char, decltype(&free)> content(static_cast<char *>(malloc(capacity + 1)), &free);

@@ -8,6 +8,7 @@
 #include <cstdio>
 
 #include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include "failure.h"
@@ -27,9 +28,31 @@ void flushToDisk() {
     static_cast<void>(syncfs(directory.get()));
 }
 
+bool isSameDirectory(const struct stat &a, const struct stat &b) {
+  return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
+}
+
+/// Whether the directory is a link to one of those on the way down to it. To enter it would begin the walk
+/// anew, and two such links would double it at each of the 40 levels that the system follows.
+bool leadsBack(const std::string &path) {
+  struct stat directory = {};
+  const std::string name = path.substr(0, path.size() - 1);
+  if (lstat(name.c_str(), &directory) != 0 || !S_ISLNK(directory.st_mode) ||
+      stat(name.c_str(), &directory) != 0)
+    return false;
+  for (std::size_t slash = path.find('/'); slash < name.size(); slash = path.find('/', slash + 1)) {
+    struct stat above = {};
+    if (stat(path.substr(0, slash).c_str(), &above) == 0 && isSameDirectory(above, directory))
+      return true;
+  }
+  return false;
+}
+
 /// Visits what a directory holds, sub-directories first, up to the first visit that fails.
 template <class Visit>
 bool walk(File &directory, const Visit &visit) {
+  if (leadsBack(directory.getPath()))
+    return true;
   const std::vector<File *> &subDirectories = *directory.listSubDirectories();
   const std::vector<File *> &files = *directory.listFiles();
   return std::all_of(subDirectories.begin(), subDirectories.end(), visit) &&
