@@ -153,12 +153,13 @@ bool File::isAbsolute() const {
 }
 
 std::string File::getAbsolutePath() const {
+  return isAbsolute() ? path_ : getAbsolutePath(Util::getCurrentDirectory());
+}
+
+std::string File::getAbsolutePath(const std::string &workingDirectory) const {
   if (isAbsolute())
     return path_;
-  std::string absolute = Util::getCurrentDirectory();
-  if (!endsInSlash(absolute))
-    absolute += '/';
-  return absolute + path_;
+  return workingDirectory + (endsInSlash(workingDirectory) ? "" : "/") + path_;
 }
 
 std::string File::getParentPath() const {

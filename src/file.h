@@ -40,6 +40,8 @@ public:
   bool isAbsolute() const;
   /// The path itself, or the working directory before it; nothing is normalised.
   std::string getAbsolutePath() const;
+  /// The same for a caller that knows the working directory.
+  std::string getAbsolutePath(const std::string &workingDirectory) const;
   /// Up to and including the "/" before the last component; see the source for paths without one.
   std::string getParentPath() const;
   /// The last component, without the "/" that ends a directory's path.

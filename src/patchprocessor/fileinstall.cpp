@@ -48,15 +48,70 @@ bool leadsBack(const std::string &path) {
   return false;
 }
 
+/// One walk through updated_files. Working directory and home are asked for once, not for each file.
+struct Walk {
+  std::string directory;
+  std::string home;
+  PatchError *err;
+};
+
+Walk walkFromHere(PatchError *err) {
+  return {Util::getCurrentDirectory(), Util::getQuillHome(), err};
+}
+
 /// Visits what a directory holds, sub-directories first, up to the first visit that fails.
-template <class Visit>
-bool walk(File &directory, const Visit &visit) {
+bool visitEntries(File &directory, const Walk &walk, bool (*visit)(File &entry, const Walk &walk)) {
   if (leadsBack(directory.getPath()))
     return true;
+  const auto visitEntry = [&](File *entry) { return visit(*entry, walk); };
   const std::vector<File *> &subDirectories = *directory.listSubDirectories();
   const std::vector<File *> &files = *directory.listFiles();
-  return std::all_of(subDirectories.begin(), subDirectories.end(), visit) &&
-         std::all_of(files.begin(), files.end(), visit);
+  return std::all_of(subDirectories.begin(), subDirectories.end(), visitEntry) &&
+         std::all_of(files.begin(), files.end(), visitEntry);
+}
+
+bool moveRegularFile(File &entry, const Walk &walk) {
+  const std::string source = entry.getAbsolutePath(walk.directory);
+  const std::string destination = walk.home + entry.getPath();
+  if (!entry.moveFile(destination, true))
+    return FAILURE(walk.err, PatchError::CannotMoveFile, "ERROR_PP_MOVE_FILE", source.c_str(),
+                   destination.c_str());
+  LOG_INFO_MESSAGE("PP_MOVE_FILE", source.c_str(), entry.getPath().c_str());
+  return true;
+}
+
+bool makeTargetDirectory(const std::string &path, PatchError *err) {
+  File target(path);
+  if (target.exists())
+    return true;
+  LOG_INFO_MESSAGE("PP_MAKE_DIR", path.c_str());
+  if (target.mkdir())
+    return true;
+  FAILURE(err, PatchError::CannotMakeDirectory, "ERROR_PP_MAKE_DIR", path.c_str());
+  // KEEP(mkdir-null-record): without a record the walk goes on; what cannot be moved then says so itself.
+  return err == nullptr;
+}
+
+bool moveEntry(File &entry, const Walk &walk) {
+  LOG_TRACE("PatchProcessor::moveFile() %s", "entry");
+  bool result = false;
+  if (entry.isDirectory())
+    result =
+        makeTargetDirectory(walk.home + entry.getPath(), walk.err) && visitEntries(entry, walk, moveEntry);
+  else
+    result = moveRegularFile(entry, walk);
+  LOG_TRACE("PatchProcessor::moveFile() %s", "exit");
+  return result;
+}
+
+bool listEntry(File &entry, const Walk &walk) {
+  if (entry.isDirectory())
+    return visitEntries(entry, walk, listEntry);
+  const std::string source = Util::removeDotFromPath(entry.getAbsolutePath(walk.directory));
+  const std::string target = Util::removeDotFromPath(walk.home + entry.getPath());
+  LOG_INFO("%s --> %s", source.c_str(), target.c_str());
+  printf("    %s\n", target.c_str());
+  return true;
 }
 
 } // namespace
@@ -87,35 +142,7 @@ bool PatchProcessor::moveFiles(PatchError *err) {
 }
 
 bool PatchProcessor::moveFile(File *entry, PatchError *err) {
-  LOG_TRACE("PatchProcessor::moveFile() %s", "entry");
-  const bool result = entry->isDirectory() ? moveDirectory(*entry, err) : moveRegularFile(*entry, err);
-  LOG_TRACE("PatchProcessor::moveFile() %s", "exit");
-  return result;
-}
-
-bool PatchProcessor::moveDirectory(File &entry, PatchError *err) {
-  const std::string path = Util::getQuillHome() + entry.getPath();
-  File target(path);
-  if (!target.exists()) {
-    LOG_INFO_MESSAGE("PP_MAKE_DIR", path.c_str());
-    if (!target.mkdir()) {
-      FAILURE(err, PatchError::CannotMakeDirectory, "ERROR_PP_MAKE_DIR", path.c_str());
-      // KEEP(mkdir-null-record): without a record the walk goes on; what cannot be moved then says so itself.
-      if (err != nullptr)
-        return false;
-    }
-  }
-  return walk(entry, [&](File *child) { return moveFile(child, err); });
-}
-
-bool PatchProcessor::moveRegularFile(File &entry, PatchError *err) {
-  const std::string source = entry.getAbsolutePath();
-  const std::string destination = Util::getQuillHome() + entry.getPath();
-  if (!entry.moveFile(destination, true))
-    return FAILURE(err, PatchError::CannotMoveFile, "ERROR_PP_MOVE_FILE", source.c_str(),
-                   destination.c_str());
-  LOG_INFO_MESSAGE("PP_MOVE_FILE", source.c_str(), entry.getPath().c_str());
-  return true;
+  return moveEntry(*entry, walkFromHere(err));
 }
 
 bool PatchProcessor::listFiles(PatchError *err) {
@@ -148,11 +175,5 @@ bool PatchProcessor::listTree(PatchError *err) {
 }
 
 bool PatchProcessor::listFile(File *entry, PatchError *err) {
-  if (entry->isDirectory())
-    return walk(*entry, [&](File *child) { return listFile(child, err); });
-  const std::string source = Util::removeDotFromPath(entry->getAbsolutePath());
-  const std::string target = Util::removeDotFromPath(Util::getQuillHome() + entry->getPath());
-  LOG_INFO("%s --> %s", source.c_str(), target.c_str());
-  printf("    %s\n", target.c_str());
-  return true;
+  return listEntry(*entry, walkFromHere(err));
 }

@@ -120,8 +120,6 @@ private:
   void writeResultFile(int resultCode) const;
   bool runIfAny(const std::vector<std::string> &commands, PatchError *err);
   bool runCommands(const std::vector<std::string> &commands, PatchError *err);
-  bool moveDirectory(File &entry, PatchError *err);
-  bool moveRegularFile(File &entry, PatchError *err);
   bool listTree(PatchError *err);
 
   std::string patchFilePath_;
