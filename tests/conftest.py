@@ -4,7 +4,10 @@ import os
 
 import pytest
 
-from support import ProductHome, Program, remove_tree, scratch_folder
+from support import ProductHome, Program, remove_tree, scratch_folder, second_account
+
+
+os.umask(0o022)  # expected modes are written for it, and other users must get into the homes
 
 
 def pytest_collection_modifyitems(items):
@@ -45,3 +48,10 @@ def patch_dir(scratch):
     folder = scratch / "patches"
     folder.mkdir()
     return folder
+
+
+@pytest.fixture
+def other_owner(scratch):
+    """An account beside root's that may log in (for tests that need root)."""
+    with second_account(scratch) as account:
+        yield account

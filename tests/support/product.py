@@ -7,13 +7,13 @@ import shutil
 import signal
 import stat
 import subprocess
-import tempfile
 import time
 from pathlib import Path
 from typing import NamedTuple
 
 from .logfile import parse_log
 from .program import identity
+from .scratch import remove_tree, scratch_folder
 from .snapshot import snapshot
 
 _SCRIPTS = Path(__file__).resolve().parent / "quill"
@@ -302,29 +302,6 @@ class ProductHome:
         except OSError:
             return False
         return os.fsencode(self.path) + b"/" in command
-
-
-def scratch_folder():
-    """A new temporary folder that every user may enter (pytest's own are closed to others). Its name holds
-    letters only: digits in a command line could be taken for a process id by whoever searches ps for one."""
-    while True:
-        name = "".join(chr(ord("a") + byte % 26) for byte in os.urandom(10))
-        folder = Path(tempfile.gettempdir()) / f"orvpatch-{name}"
-        try:
-            folder.mkdir()
-        except FileExistsError:
-            continue
-        folder.chmod(0o755)
-        return folder
-
-
-def remove_tree(folder):
-    """Removes a scratch folder, also where a test has closed a directory of it."""
-    for directory, names, _ in os.walk(folder):
-        for path in (os.path.join(directory, name) for name in names):
-            if not os.path.islink(path):
-                os.chmod(path, 0o755)
-    shutil.rmtree(folder)
 
 
 def _is_alive(pid):

@@ -1,12 +1,16 @@
 """Runs the real program as a process."""
 
+import atexit
 import os
 import pwd
 import shlex
+import shutil
 import signal
 import subprocess
 from pathlib import Path
 from typing import NamedTuple
+
+from .scratch import scratch_folder
 
 _CHECKOUT = Path(__file__).resolve().parents[2]
 
@@ -30,23 +34,34 @@ class Program:
     def __init__(self, binary=None, runner=None):
         named = binary or os.environ.get("ORVPATCH") or _CHECKOUT / "build/dev/orvpatch"
         self.binary = Path(named).absolute()
+        self._copy = None
         self.runner = shlex.split(os.environ.get("ORVPATCH_RUNNER", "")) if runner is None else list(runner)
 
     @property
     def argv(self):
         return [*self.runner, str(self.binary)]
 
+    def _argv_for(self, user):
+        """A checkout may be closed to other users (below /root, say): they run a copy of the binary."""
+        if user is None or all(folder.stat().st_mode & 0o001 for folder in self.binary.parents):
+            return self.argv
+        if self._copy is None:
+            folder = scratch_folder()
+            atexit.register(shutil.rmtree, folder)
+            self._copy = shutil.copy(self.binary, folder)
+        return [*self.runner, self._copy]
+
     def run(self, *arguments, env=None, cwd=None, user=None, close=(), stdin=subprocess.DEVNULL, timeout=120,
             wrapper=()):
         """Runs it with these arguments and waits for the end.
 
         env      variables to set, or to remove where the value is None
-        user     login name to run as, with that user's primary group only (needs root)
+        user     login name to run as, with its primary group only (needs root)
         close    descriptors among 0, 1, 2 that the program shall find closed
         wrapper  command words put in front of everything, such as ["strace", "-f"]
         """
         process = subprocess.Popen(
-            [*wrapper, *self.argv, *map(os.fsdecode, arguments)], stdin=stdin, stdout=subprocess.PIPE,
+            [*wrapper, *self._argv_for(user), *map(os.fsdecode, arguments)], stdin=stdin, stdout=subprocess.PIPE,
             stderr=subprocess.PIPE, cwd=cwd, env=_environment(env), start_new_session=True,
             preexec_fn=(lambda: [os.close(fd) for fd in close]) if close else None, **identity(user))
         try:
@@ -68,10 +83,12 @@ class Program:
 
 
 def identity(user):
-    """The options of subprocess that make a child run as this user; none for the own user (None)."""
+    """The options of subprocess that make a child run as this user, a login name or a number, with no
+    further groups; none for the own user (None)."""
     if user is None:
         return {}
-    return {"user": user, "group": pwd.getpwnam(user).pw_gid, "extra_groups": []}
+    group = user if isinstance(user, int) else pwd.getpwnam(user).pw_gid
+    return {"user": user, "group": group, "extra_groups": []}
 
 
 def stubs(directory, **scripts):

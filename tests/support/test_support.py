@@ -2,11 +2,13 @@
 
 import os
 import pwd
+import shutil
 import subprocess
+import time
 
 import pytest
 
-from support import Patch, Program, parse_log
+from support import Patch, Program, parse_log, second_account, stubs
 
 
 def alive(pid):
@@ -202,7 +204,6 @@ def test_program_that_does_not_end_is_killed_with_its_children(scratch):
 
 
 def alive_within(pid, seconds):
-    import time
     limit = time.monotonic() + seconds
     while alive(pid) and time.monotonic() < limit:
         time.sleep(0.02)
@@ -213,3 +214,30 @@ def alive_within(pid, seconds):
 def test_program_runs_as_another_user(scratch):
     shell = Program("/bin/sh", runner=[])
     assert shell.run("-c", "id -un; id -Gn", user="nobody").out == b"nobody\nnogroup\n"
+
+
+@pytest.mark.needs_root
+def test_another_user_runs_a_program_that_it_could_not_reach(scratch):
+    closed = scratch / "closed"
+    closed.mkdir(mode=0o700)
+    shutil.copy("/bin/true", closed / "true")
+    assert Program(closed / "true", runner=[]).run(user="nobody").status == 0
+
+
+@pytest.mark.needs_root
+def test_another_account_owns_an_agent_and_can_be_switched_to(home, other_owner):
+    home.start("ox", user=other_owner.uid)
+    shell = Program("/bin/sh", runner=[])
+    shown = shell.run("-c", f"ps -o user= -p {home.pid('ox')}; su - {other_owner.name} -c 'id -un'",
+                      wrapper=other_owner.wrapper)
+    assert shown == (0, b"orvagent\norvagent\n", b"")
+
+
+@pytest.mark.needs_root
+def test_a_container_without_private_mounts_gets_a_real_account(scratch, monkeypatch):
+    monkeypatch.setenv("PATH", stubs(scratch / "bin", unshare="exit 1"))
+    with second_account(scratch) as account:
+        assert account.wrapper == ()
+        assert pwd.getpwnam(account.name).pw_uid == account.uid
+    with pytest.raises(KeyError):
+        pwd.getpwnam(account.name)

@@ -1,6 +1,9 @@
 # Sourced by the sample product's control scripts and by the scripts of sample patches. The caller sets
 # quill_home, the home without a trailing "/".
 
+# An account that only the program under test knows has no name here.
+user_name() { id -un 2>/dev/null || true; }
+
 # journal PROGRAM ARGUMENT...
 # Appends one line to the home's journal: program, user, directory, PATH, QUILLHOME, arguments, separated by
 # the unit separator, which occurs in none of them. Saves a copy of every watched file beside it, so that
@@ -8,7 +11,7 @@
 journal() {
   [ -z "${QUILL_UNJOURNALED-}" ] || return 0
   us=$(printf '\037')
-  line="$1$us$(id -un)$us$(pwd)$us$PATH$us${QUILLHOME-}"
+  line="$1$us$(user_name)$us$(pwd)$us$PATH$us${QUILLHOME-}"
   shift
   for argument in "$@"; do
     line="$line$us$argument"

@@ -60,7 +60,7 @@ start_instance() {
   pids=$(spawn "$file")
   echo "$pids" >>"$quill_home/control/started"
   sep=$(field_separator)
-  printf '%s\n' "$(uname -n)$sep$1$sep${pids% *}$sep$name$sep$(id -un)" >>"$run_info"
+  printf '%s\n' "$(uname -n)$sep$1$sep${pids% *}$sep$name$sep$(user_name)" >>"$run_info"
 }
 
 # stop_instance CODE INSTANCE
