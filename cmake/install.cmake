@@ -3,10 +3,6 @@
 
 include(GNUInstallDirs)
 
-# Whatever the umask of whoever builds.
-set(CMAKE_INSTALL_DEFAULT_DIRECTORY_PERMISSIONS
-  OWNER_READ OWNER_WRITE OWNER_EXECUTE GROUP_READ GROUP_EXECUTE WORLD_READ WORLD_EXECUTE)
-
 # orvpatch_compressed(VARIABLE SOURCE NAME): has a file compressed under a name as part of the build; -n keeps
 # time and name of the source out of it.
 function(orvpatch_compressed variable source name)

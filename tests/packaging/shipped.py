@@ -1,0 +1,91 @@
+"""Builds what is shipped, in folders of its own under build/shipped, from copies of the sources."""
+
+import contextlib
+import fcntl
+import functools
+import os
+import shutil
+import subprocess
+from pathlib import Path
+from typing import NamedTuple
+
+CHECKOUT = Path(__file__).resolve().parents[2]
+EPOCH = 1795219200  # any moment; not that of a checkout or a build
+_SHIPPED = ["CMakeLists.txt", "CMakePresets.json", "cmake", "completions", "docs", "man", "packaging", "src",
+            "CHANGELOG.md", "README.md", "SECURITY.md"]
+
+
+class Architecture(NamedTuple):
+    preset: str
+    deb: str
+    machine: str  # as readelf names it
+    libraries: frozenset
+    runner: tuple
+    packages: tuple
+
+
+AMD64 = Architecture(
+    "release", "amd64", "Advanced Micro Devices X86-64", frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), (),
+    ("orvpatch-{v}-linux-x86_64.tar.gz", "orvpatch_{v}-1_amd64.deb"))
+PPC64LE = Architecture(
+    "ppc64le", "ppc64el", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}),
+    ("qemu-ppc64le", "-L", "/usr/powerpc64le-linux-gnu"),
+    ("orvpatch-{v}-1.ppc64le.rpm", "orvpatch-{v}-linux-ppc64le.tar.gz", "orvpatch_{v}-1_ppc64el.deb"))
+ARCHITECTURES = [AMD64, PPC64LE]
+
+
+class Build(NamedTuple):
+    """One build of one architecture."""
+
+    architecture: Architecture
+    folder: Path
+    output: str  # what compilers, linkers and cmake printed
+
+    @property
+    def program(self):
+        return self.folder / "orvpatch"
+
+    @property
+    def packages(self):
+        return self.folder / "packages"
+
+    def package(self, suffix):
+        return next(self.packages.glob(f"*{suffix}"))
+
+
+@functools.cache
+def ship(architecture, folder, umask, **environment):
+    """Builds and packs in `folder` below build/shipped, incrementally; tests that run at once wait in turn."""
+    source = CHECKOUT / "build/shipped" / folder
+    source.mkdir(parents=True, exist_ok=True)
+    with _locked(source.parent / f"{source.name}.lock"):
+        _copy_sources(source)
+        done = subprocess.run(["packaging/pack", architecture.preset], cwd=source, umask=umask, text=True,
+                              stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, check=False,
+                              env={**os.environ, "SOURCE_DATE_EPOCH": str(EPOCH), **environment})
+    assert done.returncode == 0, done.stdout
+    return Build(architecture, source / "build" / architecture.preset, done.stdout)
+
+
+@contextlib.contextmanager
+def _locked(path):
+    with open(path, "w", encoding="ascii") as lock:
+        fcntl.flock(lock, fcntl.LOCK_EX)
+        yield
+
+
+def _copy_sources(target):
+    """Files keep their time where the content has not changed, so that a second run builds nothing."""
+    listed = subprocess.run(["git", "ls-files", "-co", "--exclude-standard", "--", *_SHIPPED], cwd=CHECKOUT,
+                            check=True, capture_output=True, text=True).stdout.split()
+    wanted = {Path(path) for path in listed if (CHECKOUT / path).is_file()}
+    for path in target.rglob("*"):
+        relative = path.relative_to(target)
+        if path.is_file() and relative.parts[0] != "build" and relative not in wanted:
+            path.unlink()
+    for path in wanted:
+        content = (CHECKOUT / path).read_bytes()
+        if not (target / path).exists() or (target / path).read_bytes() != content:
+            (target / path).parent.mkdir(parents=True, exist_ok=True)
+            shutil.copy(CHECKOUT / path, target / path)
+

@@ -1,0 +1,93 @@
+"""Packages installed into an empty root, and the program in it run on a home of the sample product."""
+
+import subprocess
+
+import pytest
+
+from shipped import AMD64, PPC64LE
+from support import Patch, Program
+
+pytestmark = pytest.mark.packages
+
+
+def run(*command):
+    done = subprocess.run(command, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, text=True, check=False)
+    assert done.returncode == 0, done.stdout
+    return done.stdout
+
+
+def by_dpkg(build, root):
+    """The root has neither the packages that are asked for nor, for the target, the architecture."""
+    for folder in ("info", "updates", "triggers"):
+        (root / "var/lib/dpkg" / folder).mkdir(parents=True)
+    for record in ("status", "available"):
+        (root / "var/lib/dpkg" / record).touch()
+    run("dpkg", f"--root={root}", "--force-depends", "--force-architecture", "--log=/dev/null", "-i",
+        build.package(".deb"))
+    assert "\nStatus: install ok installed\n" in run("dpkg", f"--root={root}", "-s", "orvpatch")
+    return root / "usr"
+
+
+def by_rpm(build, root):
+    options = ["--root", root, "--dbpath", "/var/lib/rpm"]
+    run("rpm", *options, "--nodeps", "--ignorearch", "-i", build.package(".rpm"))
+    assert run("rpm", *options, "-q", "orvpatch").strip() + ".rpm" == build.package(".rpm").name
+    assert run("rpm", *options, "-V", "--nodeps", "orvpatch") == ""
+    return root / "usr"
+
+
+def by_tar(build, root):
+    run("tar", "-C", root, "--strip-components=1", "-xzf", build.package(".tar.gz"))
+    return root
+
+
+WAYS = [(AMD64, by_dpkg), (AMD64, by_tar), (PPC64LE, by_dpkg), (PPC64LE, by_tar), (PPC64LE, by_rpm)]
+
+
+@pytest.fixture
+def prefix(request, build, tmp_path):
+    """Where sbin and share are after the installation."""
+    return request.param(build, tmp_path)
+
+
+in_every_way = pytest.mark.parametrize(
+    "architecture, prefix", WAYS, indirect=True, ids=[f"{arch.preset}-{way.__name__}" for arch, way in WAYS])
+
+
+@in_every_way
+def test_installed_program_patches_a_home(prefix, build, home, patch_dir):
+    home.component("xe", desc="Database Agent")
+    home.component("ox", desc="Agent of the system")
+    home.start("xe", "prod")
+    home.start("ox")
+    home.write("bin/kxeagent", b"old\n")
+    patch = Patch("xe", level="06100001", dependents=["kox"]).file("bin/kxeagent").script("10.sh", when="post")
+    patch.write(patch_dir)
+    running = home.instances()
+    program = Program(prefix / "sbin/orvpatch", build.architecture.runner)
+
+    report = program.report(home, patch_dir)
+    assert (report.status, report.err) == (0, b"")
+    assert f"    {home.path}/bin/kxeagent\n".encode() in report.out
+    assert (home.read("bin/kxeagent"), home.level("xe")) == (b"old\n", "06100000")
+
+    assert program.install(home, patch_dir) == (0, b"\nCommand completed successfully.\n\n", b"")
+    assert (home.read("bin/kxeagent"), home.level("xe")) == (b"new\n", "06100001")
+    assert [line.result for line in home.history()] == ["PASS"]
+    assert home.instances() == running
+
+
+@in_every_way
+def test_installed_pages_can_be_read(prefix):
+    for page in sorted((prefix / "share/man").rglob("*.gz")):
+        done = subprocess.run(["mandoc", "-T", "ascii", page.relative_to(prefix / "share/man")], check=True,
+                              cwd=prefix / "share/man", capture_output=True, text=True)
+        assert "ORV" in done.stdout, page
+
+
+def test_installed_by_cmake_below_a_prefix(build, tmp_path):
+    run("cmake", "--install", build.folder, "--prefix", tmp_path)
+    assert (tmp_path / "sbin/orvpatch").stat().st_mode & 0o7777 == 0o755
+    assert (tmp_path / "share/zsh/site-functions/_orvpatch").is_file()
+    assert (tmp_path / "share/man/man8/orvpatch.8.gz").is_file()
+    assert not (tmp_path / "share/lintian").exists()

@@ -1,0 +1,61 @@
+"""What can be read from the shipped program: its libraries, their level, and how it is hardened."""
+
+import re
+import subprocess
+
+import pytest
+
+pytestmark = pytest.mark.packages
+
+
+@pytest.fixture
+def elf(build):
+    """readelf's view of the program: header, program headers, dynamic section, dynamic symbols."""
+    done = subprocess.run(["readelf", "-W", "-h", "-l", "-d", "--dyn-syms", build.program], check=True,
+                          capture_output=True, text=True)
+    return done.stdout
+
+
+def undefined_symbols(elf):
+    return set(re.findall(r" UND (\w+)@GLIBC_", elf))
+
+
+def test_machine(elf, architecture):
+    assert re.search(r"Machine: +(.*)", elf)[1] == architecture.machine
+    assert "2's complement, little endian" in elf
+
+
+def test_needs_the_c_library_only(elf, architecture):
+    assert set(re.findall(r"\(NEEDED\).*\[(.*)\]", elf)) == architecture.libraries
+
+
+def test_c_library_level(elf, build):
+    """2.35 brings the look-up of unwinding tables that the compiler's run-time library calls."""
+    levels = {tuple(map(int, level.split("."))) for level in re.findall(r"GLIBC_([\d.]+)", elf)}
+    assert max(levels) == (2, 35)
+    assert (build.folder / "libc-level").read_text() == "2.35\n"
+
+
+def test_is_position_independent(elf):
+    assert re.search(r"Type: +DYN \(Position-Independent Executable file\)", elf)
+    assert re.search(r"\(FLAGS_1\).* PIE\b", elf)
+
+
+def test_relocations_are_read_only_and_bound_at_start(elf):
+    assert re.search(r"^ +GNU_RELRO ", elf, re.M)
+    assert re.search(r"\(FLAGS\) +BIND_NOW", elf)
+    assert re.search(r"\(FLAGS_1\).* NOW\b", elf)
+
+
+def test_stack_is_protected_and_not_executable(elf):
+    assert "__stack_chk_fail" in undefined_symbols(elf)
+    assert re.search(r"^ +GNU_STACK +(?:0x\w+ +){5}RW ", elf, re.M)
+
+
+def test_library_calls_are_fortified(elf):
+    """Those that the sources make: formatting into a buffer and to a stream."""
+    assert {"__vsnprintf_chk", "__printf_chk", "__fprintf_chk"} <= undefined_symbols(elf)
+
+
+def test_carries_no_search_path(elf):
+    assert "(RPATH)" not in elf and "(RUNPATH)" not in elf
