@@ -106,10 +106,10 @@ def checked_sources(*suffixes):
 
 def static_stages():
     sources = [path for path in checked_sources(".cpp") if path.startswith("src/")]
-    tidy = f"printf '%s\\n' {' '.join(sources)} | xargs -P2 -n2 clang-tidy -p build/clang --quiet"
+    tidy = f"printf '%s\\n' {' '.join(sources)} | xargs -P2 -n2 clang-tidy -p build/dev --quiet"
     return [
         Stage("format", [["clang-format", "--dry-run", "--Werror", *checked_sources(".cpp", ".h", ".c")]]),
-        Stage("tidy", [["bash", "-c", tidy]], ["build-clang"]),
+        Stage("tidy", [["bash", "-c", tidy]], ["build-dev"]),
         cases("house", ["tests/house", "tests/support", "tests/man", "tests/completions"]),
     ]
 

@@ -115,8 +115,10 @@ int testPatch(const std::string &path) {
 
 int validatePatchFile(const std::string &path) {
   PatchError error;
-  const std::unique_ptr<PatchDescriptor> descriptor(PatchDescriptor::parseFile(path, &error));
-  if (descriptor == nullptr) {
+  std::unique_ptr<PatchDescriptor> descriptor(PatchDescriptor::parseFile(path, &error));
+  const bool valid = descriptor != nullptr;
+  descriptor.reset();
+  if (!valid) {
     fprintf(stderr, "\n%s\n\n", error.text.c_str());
     return error.code;
   }
