@@ -113,12 +113,12 @@ ORVComponentRegistry::~ORVComponentRegistry() {
 
 std::string getCInfo_Running(std::string home) {
   LOG_TRACE("ORVComponentRegistry::getCInfo_Running %s", "entry");
+  std::string text;
   char *content = nullptr;
-  if (Util::readFile((home + "config/.ConfigData/RunInfo").c_str(), &content) != 0) {
+  if (Util::readFile((home + "config/.ConfigData/RunInfo").c_str(), &content) == 0)
+    text = content;
+  else
     LOG_TRACE("unable to read RunInfo file");
-    return "";
-  }
-  const std::string text = content;
   free(content);
   // KEEP(cinfo-exit-name): the exit line names the operation without its suffix.
   LOG_TRACE("ORVComponentRegistry::getCInfo %s", "exit");
