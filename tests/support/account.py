@@ -6,9 +6,10 @@ import subprocess
 from pathlib import Path
 from typing import NamedTuple
 
-_NAME = "orvagent"  # ps shows names of up to eight characters
-_UID = 64321
-_ENTRY = f"{_NAME}:*:{_UID}:{_UID}::/:/bin/sh\n"
+# Test processes that run side by side each have an account of their own. ps shows names of up to eight
+# characters; digits in a name could be taken for a process id by whoever searches the output of ps for one.
+_NAME = "orv" + "".join(chr(ord("a") + os.getpid() // 26**place % 26) for place in range(5))
+_UID = 60000 + os.getpid() % 5000
 
 
 class Account(NamedTuple):
@@ -28,17 +29,18 @@ def second_account(folder):
     if _knows(private):
         yield private
         return
-    subprocess.run(["useradd", "--no-create-home", "--home-dir", "/", "--shell", "/bin/sh", "--uid", str(_UID),
-                    _NAME], check=True)
+    subprocess.run(["useradd", "--no-create-home", "--no-user-group", "--home-dir", "/", "--shell", "/bin/sh",
+                    "--uid", str(_UID), _NAME], check=True)
     try:
         yield Account(_NAME, _UID, ())
     finally:
-        subprocess.run(["userdel", _NAME], check=True)
+        subprocess.run(["userdel", "--force", _NAME], check=True)  # also while an agent still runs
 
 
 def _private_account(folder):
     passwd = folder / "passwd"
-    passwd.write_text(Path("/etc/passwd").read_text(encoding="utf-8") + _ENTRY, encoding="utf-8")
+    accounts = Path("/etc/passwd").read_bytes()
+    passwd.write_bytes(accounts + f"{_NAME}:*:{_UID}:{_UID}::/:/bin/sh\n".encode())
     passwd.chmod(0o644)
     mount = 'mount --bind "$0" /etc/passwd && exec "$@"'
     return Account(_NAME, _UID, ("unshare", "--mount", "/bin/sh", "-c", mount, os.fspath(passwd)))

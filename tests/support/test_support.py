@@ -230,7 +230,7 @@ def test_another_account_owns_an_agent_and_can_be_switched_to(home, other_owner)
     shell = Program("/bin/sh", runner=[])
     shown = shell.run("-c", f"ps -o user= -p {home.pid('ox')}; su - {other_owner.name} -c 'id -un'",
                       wrapper=other_owner.wrapper)
-    assert shown == (0, b"orvagent\norvagent\n", b"")
+    assert shown == (0, f"{other_owner.name}\n{other_owner.name}\n".encode(), b"")
 
 
 @pytest.mark.needs_root
