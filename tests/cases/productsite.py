@@ -33,6 +33,7 @@ class Site:
     def __init__(self, home, program, patch_dir):
         self.home, self.program, self.patch_dir = home, program, patch_dir
         self.user = None  # login name that the program runs as; None: that of the tests
+        self.env = {}     # variables to set for the program
         self._before = None
 
     # --- actions: each returns the Result of the program -----------------------------------------------
@@ -48,9 +49,9 @@ class Site:
         path = self.descriptor(descriptor) if "\n" in str(descriptor) else descriptor
         return self.run("-h", self.home, "-vi", path, **options)
 
-    def run(self, *words, **options):
+    def run(self, *words, env=(), **options):
         self._before = self.home.tree()
-        return self.program.run(*words, **{"user": self.user, **options})
+        return self.program.run(*words, env={**self.env, **dict(env)}, **{"user": self.user, **options})
 
     def target(self, *what):
         """The path that stands for these patches: one file, or (for several) their folder; other paths
