@@ -5,6 +5,7 @@ import os
 from catalogue import text
 from loglines import (around, error, info, joined, link_into_place, list_directory, look_up, make_directory,
                       parse_descriptor, path_exists, read_lines, remove_tree, run_command, trace)
+from productsite import SEARCH_PATH
 
 PATCH = "patchprocessor"
 PACKAGE = "dcfpackageprocessor"
@@ -95,7 +96,7 @@ class PatchLines:
         return around(PATCH, f"PatchProcessor::{name}()", ran, end=f"PatchProcessor::{name}(){sign}{result}")
 
     def _ran_scripts(self, commands, outcome):
-        path = os.environ["PATH"]
+        path = SEARCH_PATH
         last = len(commands) - 1
         return done(
             "runScripts", trace(PATCH, f"old PATH={path}", f"Setting PATH={self.temp}:{path}"),

@@ -17,6 +17,7 @@ USAGE = (
 )
 SUCCESS = f"\n{text('MAIN_SUCCESSFUL')}\n\n"
 NOTHING = ""  # on this stream
+SEARCH_PATH = "/usr/local/sbin:/usr/local/bin:/usr/sbin:/usr/bin:/sbin:/bin"  # every user may search it
 
 # Written by every run, or by the sample's own scripts: no case tells them as a change of the home.
 _BOOKKEEPING = ("patchlogs/orvpatch.log", "config/.ConfigData/RunInfo")
@@ -33,7 +34,7 @@ class Site:
     def __init__(self, home, program, patch_dir):
         self.home, self.program, self.patch_dir = home, program, patch_dir
         self.user = None  # login name that the program runs as; None: that of the tests
-        self.env = {}     # variables to set for the program
+        self.env = {"PATH": SEARCH_PATH}  # variables to set for the program
         self._before = None
 
     # --- actions: each returns the Result of the program -----------------------------------------------
