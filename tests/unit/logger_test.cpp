@@ -11,6 +11,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
@@ -331,6 +332,14 @@ TEST_F(LoggerTest, ReadOnlyPatchlogsIsReportedOnStandardError) {
   LOG_TRACE("line");
   const std::string complaint = "Unable to write to log file: " + logPath() + "\n";
   EXPECT_EQ(GetCapturedStderr(), complaint + complaint);
+}
+
+TEST_F(LoggerTest, PipeInPlaceOfTheLogIsReportedAndNotWaitedFor) {
+  makeDirectory("patchlogs");
+  ASSERT_EQ(mkfifo(logPath().c_str(), 0600), 0);
+  CaptureStderr();
+  logInit();
+  EXPECT_EQ(GetCapturedStderr(), "Unable to write to log file: " + logPath() + "\n");
 }
 
 TEST_F(LoggerTest, MissingHomeIsReportedOnStandardError) {

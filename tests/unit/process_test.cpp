@@ -1,6 +1,7 @@
 // Child processes, with real ones: what is captured, what is handed back, what a child inherits.
 #include "process.h"
 
+#include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
@@ -248,6 +249,36 @@ TEST_F(ProcessTest, OtherDescriptorsAreInherited) {
   close(shared);
   EXPECT_EQ(result.rc, 0);
   EXPECT_EQ(read(path), "by the child\n");
+}
+
+TEST_F(ProcessTest, ProcessLeftBehindBySilentProgramIsNotWaitedFor) {
+  const CapturedRun result = captureShell("sleep 60 & echo $! > " + home() + "pid");
+  const pid_t leftBehind = std::stoi(read(home() + "pid"));
+  EXPECT_EQ(kill(leftBehind, SIGKILL), 0) << "it ran when runCommand returned";
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, 0);
+  EXPECT_EQ(result.out + result.err, "");
+}
+
+/// Whether the signals that a write may raise have this disposition.
+void expectWriteSignals(void (*disposition)(int)) {
+  for (const int number : {SIGPIPE, SIGXFSZ}) {
+    struct sigaction action = {};
+    ASSERT_EQ(sigaction(number, nullptr, &action), 0);
+    EXPECT_EQ(action.sa_handler, disposition) << number;
+  }
+}
+
+TEST_F(ProcessTest, WriteSignalsThatTheCallerIgnoresAreAtTheirDefaultInAProgram) {
+  setWriteSignals(SIG_IGN);
+  expectWriteSignals(SIG_IGN);
+  const CapturedRun onPipe = captureShell("kill -PIPE $$; echo survived");
+  const CapturedRun onSize = captureShell("ulimit -c 0; kill -XFSZ $$; echo survived");
+  expectWriteSignals(SIG_IGN);
+  setWriteSignals(SIG_DFL);
+  expectWriteSignals(SIG_DFL);
+  EXPECT_EQ(onPipe.out, "");
+  EXPECT_EQ(onSize.out, "");
 }
 
 /// How often a pipe stands in a listing of descriptors.

@@ -136,12 +136,14 @@ TEST_F(ReadFileTest, FileThatCannotBeOpenedIsAnInvalidArgument) {
                                   failedExit(path, InvalidArgument)}));
 }
 
-TEST_F(ReadFileTest, FileOfTheLargestSizeIsAnInvalidArgument) {
+TEST_F(ReadFileTest, FileWhoseSizeNeedsMoreThan31BitsIsAnInvalidArgument) {
   const std::string path = write("huge", "");
-  ASSERT_EQ(truncate(path.c_str(), 2147483647), 0);
-  const ReadFile file(path.c_str());
-  EXPECT_EQ(file.result, InvalidArgument);
-  EXPECT_EQ(file.buffer, nullptr);
+  for (const off_t size : {off_t{2147483647}, off_t{2147483648}, off_t{5} << 30}) {
+    ASSERT_EQ(truncate(path.c_str(), size), 0);
+    const ReadFile file(path.c_str());
+    EXPECT_EQ(file.result, InvalidArgument) << size;
+    EXPECT_EQ(file.buffer, nullptr) << size;
+  }
 }
 
 TEST_F(ReadFileTest, FifoAndDeviceAreInvalidArgumentsAndNeverWaitedFor) {

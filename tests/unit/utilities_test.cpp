@@ -153,6 +153,17 @@ TEST_F(UtilitiesTest, UnsetHomeIsEmpty) {
   EXPECT_EQ(Util::getQuillHome(), "");
 }
 
+TEST_F(UtilitiesTest, EnvironmentIsSetAndSetAgain) {
+  const std::string name = "QUILL_TEST_VALUE";
+  Util::setEnvironment(name, "first");
+  EXPECT_STREQ(getenv(name.c_str()), "first");
+  Util::setEnvironment(name, "second=with equal sign");
+  EXPECT_STREQ(getenv(name.c_str()), "second=with equal sign");
+  Util::setEnvironment(name, "");
+  EXPECT_STREQ(getenv(name.c_str()), "");
+  unsetenv(name.c_str());
+}
+
 TEST_F(UtilitiesTest, HostNameIsTheNodeNameUpToItsFirstDot) {
   utsname host{};
   ASSERT_EQ(uname(&host), 0);

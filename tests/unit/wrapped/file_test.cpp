@@ -68,16 +68,6 @@ TEST_F(FileFailureTest, OnlyMissingPathsAreNotLogged) {
                                            ". Permission denied")});
 }
 
-TEST_F(FileFailureTest, PathThatIsNotAccessibleKeepsItsKind) {
-  const std::string path = write("file", "text");
-  failCall("access", EACCES).on(path);
-  const File file(path);
-  EXPECT_FALSE(file.exists());
-  EXPECT_TRUE(file.isFile());
-  EXPECT_EQ(file.getSize(), 4);
-  EXPECT_EQ(logLines(), LogLines{});
-}
-
 TEST_F(FileFailureTest, FileThatCannotBeDeletedStaysAndIsSaidToBeGone) {
   File file(write("source", "kept"));
   failCall("unlink", EACCES).on(source());
