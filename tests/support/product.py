@@ -180,16 +180,18 @@ class ProductHome:
 
     @property
     def run_info(self):
-        return self.read(_RUN_INFO).decode()
+        return os.fsdecode(self.read(_RUN_INFO))
 
     @run_info.setter
     def run_info(self, text):
-        self.write(_RUN_INFO, text, 0o666)
+        self.write(_RUN_INFO, os.fsencode(text), 0o666)
 
     def rows(self):
-        """The rows of the run information as Instance tuples in file order, live or not."""
-        fields = [row.split(self._separator()) for row in self.run_info.splitlines()[1:]]
-        return [Instance(code, "" if name == "None" else name, int(pid)) for _, code, pid, name, *_ in fields]
+        """The well-formed rows of the run information as Instance tuples in file order, live or not."""
+        separator = self._separator()
+        fields = [row.split(separator) for row in self.run_info.split("\n")[1:]] if separator else []
+        return [Instance(row[1], "" if row[3] == "None" else row[3], int(row[2]))
+                for row in fields if len(row) >= 5 and row[2].isdecimal()]
 
     def instances(self):
         """(code, instance) of all rows whose process lives, sorted; the default instance is ""."""
@@ -218,7 +220,7 @@ class ProductHome:
             watched.writelines(f"{path}\n" for path in paths)
 
     def journal(self):
-        lines = self.read("journal").decode("utf-8", "surrogateescape").splitlines()
+        lines = os.fsdecode(self.read("journal")).split("\n")[:-1]
         return [self._call(number, line) for number, line in enumerate(lines, 1)]
 
     def calls(self):
@@ -232,7 +234,7 @@ class ProductHome:
         """The records of the patch history, in order, without padding; empty when there is no file."""
         if not self.exists("patchlogs/patches.hist"):
             return []
-        lines = self.read("patchlogs/patches.hist").decode().splitlines()
+        lines = os.fsdecode(self.read("patchlogs/patches.hist")).split("\n")[:-1]
         return [HistoryLine(*(field.strip() for field in line.split(" | ")))
                 for line in lines if not line.startswith("#")]
 

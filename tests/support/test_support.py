@@ -137,6 +137,14 @@ def test_tree_sees_a_change_of_content_and_mode_but_not_the_own_records(home):
     assert home.tree()["bin/tool"] == before["bin/tool"]._replace(mode=0o700, content=b"two")
 
 
+def test_rows_that_tell_nothing_are_passed_over(home):
+    home.start("ox")
+    home.run_info += "short|row\nhost|yn|no-pid|None|x\n\n"
+    assert home.instances() == [("ox", "")]
+    home.run_info = "no separator\nhost|yn|1|None|x\n"
+    assert home.rows() == []
+
+
 def members(archive):
     return subprocess.run(["tar", "-tf", archive], capture_output=True, check=True).stdout.decode().splitlines()
 
