@@ -1,6 +1,7 @@
 // The list of installed components: which version files count, what is taken from them, and the look-ups.
 #include "orvcomponentregistry.h"
 
+#include <algorithm>
 #include <filesystem>
 #include <map>
 #include <memory>
@@ -36,22 +37,15 @@ public:
     EXPECT_LE(components->size(), 1U);
     return components->empty() ? nullptr : components->front();
   }
-  /// What the registry itself logs while it is built from a version file with this text.
-  LogLines builtLines(const std::string &text) {
-    write("registry/oxlpp266.ver", text);
-    makeDirectory("config");
-    registry();
-    LogLines lines = linesOf("orvcomponentregistry", logLines());
-    const LogLine start = trace("orvcomponentregistry", "ORVComponentRegistry::ORVComponentRegistry entry");
-    while (lines.size() > 1 && !(lines.front() == start && !contains(lines, start)))
-      lines.erase(lines.begin());
-    return lines;
+  /// What is logged while the registry is built anew.
+  LogLines linesOfBuilding() {
+    delete registry();
+    logLines();
+    ORVComponentRegistry::getInstance();
+    return withoutPointers(logLines());
   }
   static bool contains(const LogLines &lines, const LogLine &line) {
-    for (std::size_t i = 1; i < lines.size(); ++i)
-      if (lines[i] == line)
-        return true;
-    return false;
+    return std::find(lines.begin(), lines.end(), line) != lines.end();
   }
 };
 
@@ -84,14 +78,11 @@ TEST_F(RegistryTest, MissingRegistryDirectoryGivesAnEmptyList) {
 TEST_F(RegistryTest, BuildingIsTracedFromEndToEnd) {
   const std::string path = install("oxlpp266.ver", "06100000", "Agent", {"none"});
   const std::string runInfo = write("config/.ConfigData/RunInfo", "\n");
-  delete registry();
-  logLines();
-  ORVComponentRegistry::getInstance();
   const auto util = [](const std::vector<std::string> &messages) {
     return traces("utilities.cpp", messages);
   };
   EXPECT_EQ(
-      withoutPointers(logLines()),
+      linesOfBuilding(),
       joined(
           {own({"ORVComponentRegistry::ORVComponentRegistry entry",
                 "ORVComponentRegistry::buildComponents entry",
@@ -165,11 +156,9 @@ class IgnoredFileTest : public RegistryTest, public ::testing::WithParamInterfac
 
 TEST_P(IgnoredFileTest, IsNotEvenRead) {
   write(std::string("registry/") + GetParam(), "VRMF = 06100000\n");
-  delete registry();
-  logLines();
-  EXPECT_TRUE(registry()->getInstalledComponents()->empty());
-  for (const LogLine &line : logLines())
+  for (const LogLine &line : linesOfBuilding())
     EXPECT_EQ(line.message.find("buildComponent("), std::string::npos) << line;
+  EXPECT_TRUE(registry()->getInstalledComponents()->empty());
 }
 
 INSTANTIATE_TEST_SUITE_P(Names, IgnoredFileTest,
@@ -226,19 +215,19 @@ TEST_F(RegistryTest, FileMayHaveCarriageReturns) {
 
 // KEEP(prereq-first-piece)
 TEST_F(RegistryTest, EveryPrerequisiteLineAddsItsFirstPiece) {
+  const std::string path =
+      write("registry/oxlpp266.ver", "VRMF = 06100000\npreReqALL = kox|kqa\npreReqALL = none\n"
+                                     "preReqALL = qalpp266\npreReqALL = ||\npreReqALL =\npreReqALL = NONE\n");
   EXPECT_EQ(
-      builtLines("VRMF = 06100000\npreReqALL = kox|kqa\npreReqALL = none\npreReqALL = qalpp266\n"
-                 "preReqALL = ||\npreReqALL =\npreReqALL = NONE\n"),
-      joined({own(
-          {"ORVComponentRegistry::ORVComponentRegistry entry", "ORVComponentRegistry::buildComponents entry",
+      linesOf("orvcomponentregistry", linesOfBuilding()),
+      own({"ORVComponentRegistry::ORVComponentRegistry entry", "ORVComponentRegistry::buildComponents entry",
            "ORVComponentRegistry::getCInfo_Running entry", "unable to read RunInfo file",
-           "ORVComponentRegistry::getCInfo exit",
-           "ORVComponentRegistry::buildComponent(" + home() + "registry/oxlpp266.ver) entry",
+           "ORVComponentRegistry::getCInfo exit", "ORVComponentRegistry::buildComponent(" + path + ") entry",
            "Added preReqALL value = kox", "Added preReqALL value = none", "Added preReqALL value = qalpp266",
            "preReqALL syntax unknown: Defaulting preReqALL value = none",
            "preReqALL syntax unknown: Defaulting preReqALL value = none", "Added preReqALL value = NONE",
            "ORVComponentRegistry::buildComponent exit", "ORVComponentRegistry::buildComponents exit",
-           "ORVComponentRegistry::ORVComponentRegistry exit"})}));
+           "ORVComponentRegistry::ORVComponentRegistry exit"}));
   EXPECT_EQ(ORVComponentRegistry::getInstance()->getInstalledComponents()->front()->getPrereqs(),
             (Names{"kox", "none", "qalpp266", "none", "none", "NONE"}));
 }
@@ -247,8 +236,8 @@ TEST_F(RegistryTest, FileWithoutALevelIsReadButYieldsNoComponent) {
   EXPECT_EQ(componentOf("desc = Agent\n"), nullptr);
   EXPECT_EQ(componentOf("desc = Agent\nVRMF =\n"), nullptr);
   EXPECT_EQ(componentOf("desc = Agent\nVRMF = 06100000\nVRMF = \n"), nullptr) << "the last line wins";
-  const LogLines lines = builtLines("desc = Agent\n");
-  EXPECT_TRUE(contains(lines, trace("orvcomponentregistry", "ORVComponentRegistry::buildComponent exit")));
+  EXPECT_TRUE(contains(linesOfBuilding(),
+                       trace("orvcomponentregistry", "ORVComponentRegistry::buildComponent exit")));
 }
 
 TEST_F(RegistryTest, UnreadableVersionFileIsSkippedWithATrace) {
