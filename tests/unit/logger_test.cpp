@@ -28,6 +28,9 @@ using ::testing::internal::CaptureStdout;
 using ::testing::internal::GetCapturedStderr;
 using ::testing::internal::GetCapturedStdout;
 
+// Read before main, so that no test has changed it yet.
+const bool toStandardOutputAtStart = glbLogToSTDOUT;
+
 const std::string RowOfEqualSigns(78, '=');
 
 /// The header block as a regular expression: only the build date and time are not known here.
@@ -86,6 +89,10 @@ protected:
     fs::resize_file(logPath(), 0);
   }
 };
+
+TEST(LoggerStateTest, ProgramStartsWithAFileInMind) {
+  EXPECT_FALSE(toStandardOutputAtStart);
+}
 
 TEST_F(LoggerTest, FileIsOrvpatchLogInPatchlogsOfTheHome) {
   logInit();
