@@ -2,7 +2,9 @@
 
 import pytest
 
-from productsite import Site
+pytest.register_assert_rewrite("loglines")  # its assertions then show what differs, like those of the cases
+
+from productsite import Site  # noqa: E402  (after the line above, which must come first)
 
 
 @pytest.fixture

@@ -51,6 +51,14 @@ def driver(argv, action, status, log_folder=None):
         action, info("main", verdict), trace("main", f"main = {status}"))
 
 
+def expect(site, words, action, status):
+    """Runs the program with these words: the log must hold just these lines, the status must be this."""
+    result = site.run(*words)
+    argv = [*site.program.argv[-1:], *words]
+    assert normalised(site.log()) == driver(argv, action, status, f"{site.home.prefix}patchlogs/")
+    assert result.status == status
+
+
 # --- foundation ----------------------------------------------------------------------------------------
 
 def run_command(*argv):

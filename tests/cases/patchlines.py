@@ -4,7 +4,8 @@ import os
 
 from catalogue import text
 from loglines import (around, error, info, joined, link_into_place, list_directory, look_up, make_directory,
-                      parse_descriptor, path_exists, read_lines, remove_tree, run_command, trace)
+                      parse_descriptor, path_exists, read_lines, read_missing_lines, remove_tree, run_command,
+                      stop_agent, trace)
 from productsite import SEARCH_PATH
 
 PATCH = "patchprocessor"
@@ -20,7 +21,8 @@ class PatchLines:
     """The lines about one patch of a home: `archive` is its path as given, `product` its code."""
 
     def __init__(self, home, archive, product="kox", platform="lpp266"):
-        self.home, self.archive, self.product, self.platform = home.prefix, str(archive), product, platform
+        self.site_home, self.home = home, home.prefix
+        self.archive, self.product = str(archive), product
         self.temp = f"{self.home}tmp/{product}"
         self.sources = f"{self.temp}/updated_files"
         self.version_file = f"{self.home}registry/{product[1:]}{platform}.ver"
@@ -38,25 +40,51 @@ class PatchLines:
     def created(self):
         return around(PATCH, f"PatchProcessor::createProcessor({self.archive}, {self.home})")
 
-    def initialized(self, *sections, **facts):
+    def initialized(self, *sections, there=False, **facts):
+        """`there`: the temporary directory need not be made."""
         parsed = parse_descriptor(f"{self.temp}/patch.ini", *sections, **facts)
-        return self.initialization(self.extracted_ini(), done("parsePatchDescriptor", parsed))
+        return self.initialization(self.extracted_ini(there), done("parsePatchDescriptor", parsed))
 
     def initialization(self, *body, result=1):
         return around(PATCH, "PatchProcessor::initialize()", *body,
                       end=f"PatchProcessor::initialize() retval [{result}]")
 
-    def accepted(self, initialized, prerequisites, pushed="Patch pushback succeeded."):
-        """From the applicable file to the processor in the list."""
-        return joined(self.made(), initialized, trace(PACKAGE, "Patch initialization succeeded"),
-                      self.active_programs(), prerequisites, trace(PACKAGE, pushed))
+    def accepted(self, initialized, prerequisites, *, running=(), pushed="Patch pushback succeeded."):
+        """From the applicable file to the processor in the list; `running`: how servers were looked for."""
+        return joined(self.checked(initialized, prerequisites, running=running), trace(PACKAGE, pushed))
 
-    def made(self):
-        return joined(self.applicable(), trace(PACKAGE, f"[{self.archive}] is applicable."), self.created(),
+    def checked(self, initialized, prerequisites, *, running=()):
+        return joined(self.made(), initialized, trace(PACKAGE, "Patch initialization succeeded"),
+                      self.active_programs(running), prerequisites)
+
+    def prerequisites(self, *checks):
+        """All are met; `checks`: the registry where this is the first to ask it."""
+        return done("checkPrereqs", *checks, look_up(by_arch=True))
+
+    def ignored(self):
+        """A file in a directory whose name is none of a patch."""
+        name = os.path.basename(self.archive)
+        return joined(
+            self.applicable(
+                trace("patchfilename", f"invalid patch file name: {name}"),
+                trace(PACKAGE, f"Specified filename: {name}, is not a valid patch filename, therefore the "
+                      "file is not an applicable patch."), result=0),
+            info(PACKAGE, text("DCFPP_NOT_APPLICABLE", self.archive)))
+
+    def not_initialized(self, failed, wording):
+        return joined(self.initialization(failed, trace(PATCH, wording), result=0),
+                      trace(PACKAGE, f"Error initializing patch: {self.archive}"))
+
+    def arch_of_prereq(self, arch):
+        name = "PatchProcessor::getArchFromPrereqs()"
+        return around(PATCH, name, trace(PATCH, f"PatchProcessor::getArchFromPrereqs returning = {arch}"))
+
+    def made(self, *checks):
+        return joined(self.applicable(*checks), trace(PACKAGE, f"[{self.archive}] is applicable."), self.created(),
                       trace(PACKAGE, "Calling initialize "))
 
-    def active_programs(self, *found, result=1):
-        return around(PATCH, "PatchProcessor::checkForActivePrograms()", *found,
+    def active_programs(self, found=(), result=1):
+        return around(PATCH, "PatchProcessor::checkForActivePrograms()", found,
                       trace(PATCH, f"PatchProcessor::checkForActivePrograms() = {result}"))
 
     def destroyed(self, with_descriptor=True):
@@ -69,23 +97,41 @@ class PatchLines:
 
     # --- the archive and its temporary directory -------------------------------------------------------
 
-    def extracted_ini(self):
-        return self._extraction("extractINI", self.archive, "patch.ini")
+    def extracted_ini(self, there=False):
+        return self._extraction("extractINI", there, self.archive, "patch.ini")
 
-    def extracted(self):
-        return self._extraction("extract", self.archive)
+    def extracted(self, there=False):
+        return self._extraction("extract", there, self.archive)
 
-    def _extraction(self, name, *words):
-        return done(name, make_directory(f"{self.temp}/"), run_command("tar", "-xf", *words),
+    def _extraction(self, name, there, *words):
+        made = [] if there else [f"{self.temp}/"]
+        return done(name, make_directory(*made), run_command("tar", "-xf", *words),
                     trace(PATCH, "tar returned: 0", "stdout: ", "stderr: "))
 
     def cleaned_up(self, directories=1):
         return done("cleanUp", remove_tree(directories))
 
-    # --- command lists ---------------------------------------------------------------------------------
+    def not_cleaned_up(self):
+        """The temporary directory is a link to an empty directory: nothing in it is touched."""
+        failed = f"Unable to delete directory [{self.temp}/]: rc = 20, Not a directory"
+        return done("cleanUp", around("file.cpp", "File::rmdir", trace("file.cpp", failed), end="File::rmdir =0"),
+                    error(PATCH, text("ERROR_PP_RM_DIR", self.temp)), result=0)
 
-    def no_scripts(self, name):
-        return self.scripts(name)
+    # --- instances -------------------------------------------------------------------------------------
+
+    def listed_instances(self, *found, shown=0):
+        """A report looks for what runs (the lines `found`), then looks up each product that it shows."""
+        name = "PatchProcessor::buildDependentsList"
+        built = around(PATCH, f"{name}()", *found, end=f"{name} = 1")
+        return around(PATCH, "PatchProcessor::printDependentsList()", built, *[look_up()] * shown,
+                      end="PatchProcessor::printDependentsList = 1")
+
+    def stopped(self, instance, *words):
+        return joined(trace(PATCH, f"Attempting to stop instance [{instance}]"),
+                      stop_agent(self.site_home, *words, instance=instance),
+                      trace(PATCH, f"Adding instance [{instance}] to the list of stopped agents"))
+
+    # --- command lists ---------------------------------------------------------------------------------
 
     def scripts(self, name, *commands, outcome=None):
         """The list `name` (runPrePatchScripts, runPreScripts, runPostScripts) with these (command, out,
@@ -113,6 +159,10 @@ class PatchLines:
                       info(PATCH, text("PP_MOVE_FILES", self.sources, self.home)), walk,
                       end=f"PatchProcessor::moveFile() = {result}")
 
+    def no_files(self):
+        return joined(trace(PATCH, "PatchProcessor::moveFiles() entry"), path_exists(self.sources, there=False),
+                      info(PATCH, text("PP_NO_FILES")))
+
     def directory(self, *entries, made=None):
         """One directory of the walk; `made`: its path below the home where it had to be made."""
         new = []
@@ -125,16 +175,41 @@ class PatchLines:
         return around(PATCH, "PatchProcessor::moveFile()", link_into_place(target if replaces else None),
                       info(PATCH, text("PP_MOVE_FILE", f"{self.sources}/./{path}", target)))
 
+    def not_moved(self, source, target, reason):
+        """`reason` why it cannot be linked to a place that is taken by a directory."""
+        relative = f"./{os.path.basename(target)}"
+        return around(
+            PATCH, "PatchProcessor::moveFile()",
+            around("file.cpp", "moveFile", trace("file.cpp", f"deleting existing target: {target}",
+                                                 f"unable to link: {relative} to {target}. {reason}")),
+            error(PATCH, text("ERROR_PP_MOVE_FILE", source, target)))
+
+    def not_made(self, target):
+        return around(PATCH, "PatchProcessor::moveFile()", info(PATCH, text("PP_MAKE_DIR", target)),
+                      make_directory(target, there=0), error(PATCH, text("ERROR_PP_MAKE_DIR", target)))
+
     def listed_files(self, directories, *paths):
         listing = [f"{self.sources}/{path} --> {self.home}{path}" for path in paths]
         return around(PATCH, "PatchProcessor::listFiles()", path_exists(self.sources),
                       info(PATCH, text("PP_LIST_FILES")), *[list_directory()] * directories,
                       info(PATCH, *listing))
 
+    def steps_up_to_files(self):
+        """Without scripts, and with nothing running."""
+        return [
+            self.extracted(), self.scripts("runPrePatchScripts"),
+            done("stopDependents", look_up(), trace(PATCH, f"No running instances of {self.product} found")),
+            self.scripts("runPreScripts")]
+
     # --- records and the OS agent ----------------------------------------------------------------------
 
     def version_updated(self):
         return done("updatePatchVerFile", read_lines(self.version_file))
+
+    def version_not_updated(self):
+        return joined(trace(PATCH, "PatchProcessor::updatePatchVerFile() entry"),
+                      read_missing_lines(self.version_file),
+                      error(PATCH, text("ERROR_PP_UPDATE_VRMF", self.version_file, "2")))
 
     def recorded(self, *problem):
         return around(PATCH, "PatchProcessor::updatePatchRegistry()", *problem)
@@ -142,8 +217,9 @@ class PatchLines:
     def os_agent(self, *restart, result=1):
         return done("startOSAgentIfNeeded", *restart, result=result)
 
-    def os_agent_restarted(self, started):
-        return self.os_agent(trace(PATCH, f"Writing out: {self.home}vmaorv6/agentdepot/rc.txt"), look_up(), started)
+    def os_agent_restarted(self, started, result=1):
+        written = trace(PATCH, f"Writing out: {self.home}vmaorv6/agentdepot/rc.txt")
+        return self.os_agent(written, look_up(), started, result=result)
 
 
 def nothing_happens(name):
@@ -156,14 +232,23 @@ def _successful(command, out, err):
                   trace(PATCH, f"stdOut: {out}", f"stdErr: {err}"))
 
 
+def reported(lines, instances, directories, *files):
+    """The package processor reports on one patch."""
+    return joined(
+        lines.cleaned_up(), lines.filename_asked(),
+        done("testRun", instances, lines.extracted(), lines.listed_files(directories, *files),
+             nothing_happens("listProductEXEFiles")),
+        lines.cleaned_up(directories + 1))
+
+
 # --- package -------------------------------------------------------------------------------------------
 
-def package(path, home, *loading, result=1, destroyed=()):
+def package(path, home, *loading, result=1):
     """The package processor is made (or, with result 0, given up) for the path."""
     loaded = joined(
         trace(PACKAGE, "DCFPackageProcessor::load() entry", f"QUILLHOME=[{home.prefix}]"), *loading,
         trace(PACKAGE, f"DCFPackageProcessor::load() exit retval: [{result}]"))
-    given_up = [] if result else joined(package_destroyed(*destroyed), trace(PACKAGE, "Unable to load patch(s)"))
+    given_up = [] if result else joined(package_destroyed(), trace(PACKAGE, "Unable to load patch(s)"))
     name = f"DCFPackageProcessor::createProcessor({path}) -"
     return around(PACKAGE, name, loaded, given_up)
 
@@ -176,5 +261,20 @@ def single_file(path):
     return trace(PACKAGE, f"[{path}] is a file.")
 
 
-def failure(component, key, *arguments):
-    return error(component, text(key, *arguments))
+def sorted_processors(*loaded):
+    """`loaded`: the lines of all patches, in the order of loading; each is asked once for each kind."""
+    kinds = 5
+    return around(PACKAGE, "DCFPackageProcessor::sort() -",
+                  trace(PACKAGE, f"Total number of eligible patch files to sort: {len(loaded)}"),
+                  *[lines.filename_asked() for lines in loaded] * kinds)
+
+
+def installing(path, *parts, status=0):
+    """The action of the driver."""
+    return joined(trace("main", f"installPatch({path}) entry"), *parts,
+                  trace("main", f"installPatch({path}) = {status}"))
+
+
+def run(*patches):
+    """The package processor applies patches."""
+    return around(PACKAGE, "DCFPackageProcessor::run()", *patches)

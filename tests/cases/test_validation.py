@@ -51,7 +51,8 @@ REFUSED = {
     "case of a key matters": (FULL.replace("productCode", "productcode"), property_missing("productCode")),
     "a repeated section forgets the first": (FULL + "[ProductInfo]\n", property_missing("productEXE")),
     **{f"no {key}": (without(key, FULL), property_missing(key)) for key in REQUIRED},
-    "of several, the last required one": (without("patchName", without("productCode", FULL)), property_missing("patchName")),
+    "of several, the last required one": (
+        without("patchName", without("productCode", FULL)), property_missing("patchName")),
     "a missing productBinArch hides it": (
         without("productBinArch", without("productVer", FULL)), property_missing("productBinArch")),
     "a missing productEXE hides it": (
