@@ -14,16 +14,11 @@
 
 namespace {
 
-enum class FileKind { Regular, Directory, Special, Missing };
-
-/// The kind of file by its type itself; File::isFile also calls a device or a pipe a file.
-FileKind kindOf(const std::string &path) {
+/// Whether the path is neither a regular file nor a directory, by its type itself: File::isFile also calls a
+/// device or a pipe a file.
+bool isSpecial(const std::string &path) {
   struct stat status = {};
-  if (stat(path.c_str(), &status) != 0)
-    return FileKind::Missing;
-  if (S_ISDIR(status.st_mode))
-    return FileKind::Directory;
-  return S_ISREG(status.st_mode) ? FileKind::Regular : FileKind::Special;
+  return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode);
 }
 
 /// What a target demands of the system.
@@ -145,7 +140,7 @@ bool DCFPackageProcessor::loadPath(const std::string &home, PatchError *error) {
   if (path.isDirectory())
     return loadDirectory(home, path, error);
   // A device or a socket is neither file nor directory: nothing is loaded, and that is no failure.
-  return kindOf(path_) != FileKind::Regular || loadFile(home, path, error);
+  return isSpecial(path_) || loadFile(home, path, error);
 }
 
 bool DCFPackageProcessor::loadFile(const std::string &home, const File &file, PatchError *error) {
@@ -177,7 +172,7 @@ bool DCFPackageProcessor::loadDirectory(const std::string &home, File &directory
 bool DCFPackageProcessor::loadEntry(const std::string &home, const File &file, PatchError *error) {
   LOG_INFO_MESSAGE("DCFPP_PROCESS_PATCH", file.getName().c_str());
   // A pipe or a device with a patch's name is ignored: reading an archive from it could wait for ever.
-  if (kindOf(file.getPath()) == FileKind::Special || !isApplicable(home, file)) {
+  if (isSpecial(file.getPath()) || !isApplicable(home, file)) {
     LOG_INFO_MESSAGE("DCFPP_NOT_APPLICABLE", file.getPath().c_str());
     return true;
   }

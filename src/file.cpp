@@ -1,5 +1,6 @@
 #include "file.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 
@@ -274,13 +275,16 @@ bool File::mkdir() {
 }
 
 bool File::makeMissingDirectories() const {
+  std::vector<std::string> prefixes;
   std::string prefix = isAbsolute() ? "/" : "";
   for (const std::string &component : Util::tokenizeString(path_, "/")) {
     prefix += component + "/";
-    if (!isAccessible(prefix) && !makeOpenDirectory(prefix))
-      return false;
+    prefixes.push_back(prefix);
   }
-  return true;
+  // What is accessible has accessible ancestors: looking from the end asks once for most directories, where
+  // looking from the start would ask for every ancestor of each directory of a deep tree again.
+  const auto missing = std::find_if(prefixes.rbegin(), prefixes.rend(), isAccessible).base();
+  return std::all_of(missing, prefixes.end(), makeOpenDirectory);
 }
 
 bool File::rmdir() {
