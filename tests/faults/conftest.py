@@ -1,0 +1,46 @@
+"""What fails on demand: system calls, kills, full and foreign disks.
+
+A run takes a sample of the faults that changes every day; its seed is printed. In the environment
+    ORVPATCH_FAULTS=all           takes them all
+    ORVPATCH_FAULTS_SEED=N        takes the sample of that seed
+    ORVPATCH_FAULTS_ONLY=A,B      takes these, by the names that a failing test shows
+"""
+
+import datetime
+import os
+import random
+
+import pytest
+
+
+def pytest_configure(config):
+    config.addinivalue_line("markers", "faults: injects failures into the program, or kills it")
+
+
+def pytest_report_header():
+    return f"faults: {Choice().described()}"
+
+
+class Choice:
+    """Which of all faults a run takes."""
+
+    def __init__(self):
+        self.all = os.environ.get("ORVPATCH_FAULTS") == "all"
+        self.seed = int(os.environ.get("ORVPATCH_FAULTS_SEED") or datetime.date.today().toordinal())
+        self.only = [name for name in os.environ.get("ORVPATCH_FAULTS_ONLY", "").split(",") if name]
+
+    def described(self):
+        if self.only:
+            return ", ".join(self.only)
+        return "all" if self.all else f"a sample, ORVPATCH_FAULTS_SEED={self.seed}"
+
+    def of(self, faults, count):
+        """Those to take of `faults`, of which a sample has `count`."""
+        if self.only:
+            return [fault for fault in faults if str(fault) in self.only]
+        return list(faults) if self.all else random.Random(self.seed).sample(faults, min(count, len(faults)))
+
+
+@pytest.fixture(scope="session")
+def choice():
+    return Choice()
