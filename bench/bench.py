@@ -1,0 +1,97 @@
+"""Measures orvpatch beside the floor of its design and beside the packagers that users know.
+
+Every payload is installed by all contenders in turn, in several rounds, each time into a fresh copy of the same
+home in memory. The tables come on standard output, as docs/performance.md holds them; what is being done, on
+standard error.
+"""
+
+import argparse
+import datetime
+import os
+import platform
+import signal
+import subprocess
+import sys
+import tempfile
+from pathlib import Path
+
+ROOT = Path(__file__).resolve().parents[1]
+sys.path.insert(0, str(ROOT / "tests"))  # the sample home and the patch builder are those of the tests
+
+from measure import Meter  # noqa: E402
+from memoryfs import memory_folder  # noqa: E402
+from payloads import PAYLOADS  # noqa: E402
+from rounds import Bench  # noqa: E402
+from tables import goals_table, growth_table, system_call_table, trial_table  # noqa: E402
+
+GROWTH = ("s1", "s10", "c")
+PROGRAMS = ("cc", "tar", "dpkg", "rpm", "rsync")
+
+
+def arguments():
+    parser = argparse.ArgumentParser(description=__doc__.split("\n\n", maxsplit=1)[0])
+    keys = [payload.key for payload in PAYLOADS]
+    parser.add_argument("--payloads", default=",".join(keys), metavar="KEYS", help="only these, of %(default)s")
+    parser.add_argument("--rounds", type=int, default=7, help="default: %(default)s")
+    parser.add_argument("--tiny", action="store_true", help="payloads of a few files: shows only that all of it runs")
+    parser.add_argument("--orvpatch", type=Path, default=ROOT / "build/release/orvpatch", help="default: %(default)s")
+    chosen = parser.parse_args()
+    unknown = set(chosen.payloads.split(",")) - set(keys)
+    if unknown or chosen.rounds < 1:
+        parser.error(f"no such payload: {', '.join(sorted(unknown))}" if unknown else "no rounds")
+    if not os.access(chosen.orvpatch, os.X_OK):
+        parser.error(f"{chosen.orvpatch} has not been built")
+    return chosen
+
+
+def chosen_payloads(chosen):
+    payloads = [payload for payload in PAYLOADS if payload.key in chosen.payloads.split(",")]
+    return [payload.tiny() for payload in payloads] if chosen.tiny else payloads
+
+
+def machine(file_system, loads):
+    """What the figures depend on, as the first table."""
+    model = next((line.split(":")[1].strip() for line in Path("/proc/cpuinfo").read_text().splitlines()
+                  if line.startswith(("model name", "cpu\t"))), platform.machine())
+    rows = [("date", f"{datetime.date.today()}"), ("processor", f"{os.cpu_count()} x {model}"),
+            ("kernel", f"{platform.system()} {platform.release()}"), ("file system", file_system),
+            ("load before each run", f"{min(loads):.2f} to {max(loads):.2f}"),
+            *((program, version_of(program)) for program in PROGRAMS)]
+    return "".join(f"| {name} | {value} |\n" for name, value in [("", ""), ("---", "---"), *rows])
+
+
+def version_of(program):
+    try:
+        shown = subprocess.run([program, "--version"], capture_output=True, text=True, check=True).stdout
+    except (OSError, subprocess.CalledProcessError):
+        return "not installed"
+    return shown.splitlines()[0]
+
+
+def print_tables(trials, file_system, loads):
+    print(machine(file_system, loads))
+    print(f"## Goals\n\n{goals_table(trials)}")
+    print("## Payloads\n")
+    for trial in trials.values():
+        print(trial_table(trial))
+    print(f"## System calls\n\n{system_call_table(list(trials.values()))}")
+    print(f"## Growth\n\n{growth_table([trials[key] for key in GROWTH if key in trials])}", end="")
+
+
+def progress(text):
+    print(f"bench: {text}", file=sys.stderr)
+
+
+def main():
+    chosen = arguments()
+    signal.signal(signal.SIGTERM, lambda *_: sys.exit("ended by SIGTERM"))  # through the clean-up below
+    with memory_folder(256 if chosen.tiny else 4096) as (folder, file_system):
+        progress(f"in memory: {file_system}")
+        tempfile.tempdir = str(folder)
+        bench = Bench(chosen.orvpatch.absolute(), folder, Meter(folder))
+        trials = {payload.key: bench.trial(payload, chosen.rounds, progress) for payload in chosen_payloads(chosen)}
+    print_tables(trials, file_system, bench.loads)
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,81 @@
+"""One payload: everybody installs it, once to show that they do it right, then in rounds."""
+
+import os
+from dataclasses import dataclass, field
+
+from contenders import FLOOR, PEERS, TOOL
+from payloads import Laid
+
+
+@dataclass
+class Trial:
+    """What one payload has cost everybody who took part."""
+
+    payload: object
+    log_lines: int = 0
+    log_bytes: int = 0
+    costs: dict = field(default_factory=dict)         # contender -> its Cost in each round
+    system_calls: dict = field(default_factory=dict)  # the tool and the floor -> system call -> number
+    absent: dict = field(default_factory=dict)        # peer -> why it did not take part
+
+
+class Bench:
+    def __init__(self, tool, folder, meter):
+        self._tool, self._folder, self._meter = tool, folder, meter
+        self._floor = meter.build("floor")
+        self.loads = []  # the machine's load before each run
+
+    def trial(self, payload, rounds, progress):
+        """Lays the payload out, measures everybody on it `rounds` times, and removes it again."""
+        trial = Trial(payload)
+        laid = Laid(payload, self._folder / payload.key)
+        commands = self._commands(laid, trial)
+        for name, command in commands.items():
+            self._run(laid, command)
+            laid.verify(name)
+        for number in range(rounds):
+            progress(f"({payload.key}) round {number + 1} of {rounds}")
+            for name in _rotated(list(commands), number):
+                trial.costs.setdefault(name, []).append(self._run(laid, commands[name]))
+        for name in (TOOL, FLOOR):
+            laid.refresh()
+            trial.system_calls[name] = self._meter.system_calls(commands[name])
+        laid.remove()
+        return trial
+
+    def _commands(self, laid, trial):
+        """Contender -> the command that installs the payload."""
+        peers = self._peer_commands(laid, trial) if trial.payload.peers else {}
+        tool = [self._tool, "-h", laid.home, trial.payload.action, laid.path]
+        self._run(laid, tool)
+        trial.log_lines, trial.log_bytes = laid.log_size()
+        return {TOOL: tool, FLOOR: self._floor_command(laid, trial), **peers}
+
+    def _floor_command(self, laid, trial):
+        # As many log lines as the tool has just written, and as many bytes in them.
+        action = "install" if trial.payload.action == "-i" else "report"
+        return [self._floor, action, f"{laid.home}/", laid.version_file, str(trial.payload.files),
+                str(trial.log_lines), str(trial.log_bytes), *laid.patches]
+
+    @staticmethod
+    def _peer_commands(laid, trial):
+        commands = {}
+        for peer in PEERS:
+            obstacle = peer.obstacle()
+            if obstacle:
+                trial.absent[peer.name] = obstacle
+            else:
+                commands[peer.name] = peer.command(laid.home, laid.packages(peer.build))
+                peer.prepare(laid.template)
+        return commands
+
+    def _run(self, laid, command):
+        laid.refresh()
+        self.loads.append(os.getloadavg()[0])
+        return self._meter.cost(command)
+
+
+def _rotated(names, by):
+    """Another one begins each round, so that nobody always runs behind the same neighbour."""
+    by %= len(names)
+    return names[by:] + names[:by]
