@@ -93,6 +93,16 @@ def test_a_path_is_shown_as_it_was_given(site):
         "\n./../patches/patch.ini is valid\n\n")
 
 
+def test_the_verdict_is_logged_as_information(site):
+    site.validate(VALID)
+    assert site.log()[-2:] == [("INFO", "main", text("MAIN_SUCCESSFUL")), ("TRACE", "main", "main = 0")]
+    folder = f"{site.home.prefix}patchlogs/"
+    result = site.validate("absent")
+    assert result.out.decode() == f"\n{text('MAIN_NOT_SUCCESSFUL', folder)}\n\n"
+    assert site.log()[-2:] == [
+        ("INFO", "main", text("MAIN_NOT_SUCCESSFUL", folder)), ("TRACE", "main", "main = 5")]
+
+
 @pytest.mark.parametrize("first", ["-h", "x", "-t", ""])
 def test_the_self_check_always_succeeds(site, first):
     result = site.run(first, site.home, "-utest")

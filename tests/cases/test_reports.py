@@ -11,13 +11,12 @@ RULE = "=" * 70
 LEFT = ["+ tmp/kox", "+ tmp/kox/patch.ini"]
 ALL_COMMANDS = {"pre_patch": ["b_first.sh", "a_first.sh"], "pre": ["stopped.sh"], "post": ["z", "10 --last"]}
 
-NO_INSTANCES = "No instances of running dependent agents to stop or restart.\n\n"
-NO_PRE_PATCH = "No commands to be executed before the agent instances are stopped.\n\n"
-NO_PRE = "No commands to be executed after stopping the agent instances.\n"
-NO_POST = "No commands to be executed before starting the agent instances.\n\n"
-STOPPED = ("The following agent instances will be stopped during the patch application and restarted "
-           "afterwards:\n")
-FILES = "\nThe following files will be installed or replaced with new files:\n"
+NO_INSTANCES = text("PP_NO_RUNNING_INST") + "\n\n"
+NO_PRE_PATCH = text("PP_TEST_NO_PREPATCHSCRIPT") + "\n\n"
+NO_PRE = text("PP_TEST_NO_PRESCRIPT") + "\n"
+NO_POST = text("PP_TEST_NO_POSTSCRIPT") + "\n\n"
+STOPPED = text("PP_LIST_AGENT_INST") + "\n"
+FILES = f"\n{text('PP_LIST_FILES')}\n"
 
 
 def head(path, title="Fix pack fp0001 for kox"):
@@ -37,8 +36,22 @@ def site(site):
 
 def test_the_least_report(site):
     path = site.target(Patch("ox").directory())
-    assert site.report(path) == site.done(
-        head(path) + NO_PRE_PATCH + NO_INSTANCES + NO_PRE + FILES + "\n" + NO_POST)
+    assert site.report(path) == site.done(f"""
+{RULE}
+Processing patch file: {path}
+    Fix pack fp0001 for kox
+
+No commands to be executed before the agent instances are stopped.
+
+No instances of running dependent agents to stop or restart.
+
+No commands to be executed after stopping the agent instances.
+
+The following files will be installed or replaced with new files:
+
+No commands to be executed before starting the agent instances.
+
+""")
     assert site.changes() == []
 
 

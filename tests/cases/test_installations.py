@@ -143,6 +143,18 @@ def test_a_link_in_the_way_is_replaced_not_followed(site):
     assert (tree["bin/tool"].kind, tree["bin/tool"].content, tree["bin/real"].content) == ("file", b"new", b"kept")
 
 
+def test_each_moved_file_is_logged_as_information(site):
+    site.home.component("ox")
+    site.home.write("bin/tool", "old")
+    site.install(Patch("ox").file("bin/new/file").file("bin/tool"))
+    home, sources = site.home.prefix, f"{site.home.prefix}tmp/kox/updated_files"
+    assert site.logged("INFO")[:-1] == [
+        text("PP_MOVE_FILES", sources, home),
+        text("PP_MAKE_DIR", f"{home}./bin/new/"),
+        text("PP_MOVE_FILE", f"{sources}/./bin/new/file", f"{home}./bin/new/file"),
+        text("PP_MOVE_FILE", f"{sources}/./bin/tool", f"{home}./bin/tool")]
+
+
 def test_a_patch_may_be_applied_again(site):
     site.home.component("ox")
     path = site.target(Patch("ox", level="06100000").file("bin/tool"))
