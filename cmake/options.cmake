@@ -17,10 +17,13 @@ if(ORVPATCH_COVERAGE)
   target_link_options(orvpatch_options INTERFACE --coverage)
 endif()
 
+# For the program alone: the tests put stand-ins in place of system calls, which a library of their own would
+# then use as well.
+add_library(orvpatch_runtime INTERFACE)
 if(ORVPATCH_STATIC_RUNTIME)
   # Sections that nothing reaches are dropped: with them would go calls of the newest C libraries, which the
   # program never makes but would ask for.
-  target_link_options(orvpatch_options INTERFACE -static-libstdc++ -static-libgcc -Wl,--gc-sections)
+  target_link_options(orvpatch_runtime INTERFACE -static-libstdc++ -static-libgcc -Wl,--gc-sections)
 endif()
 
 if(ORVPATCH_HARDENED)

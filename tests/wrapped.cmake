@@ -34,4 +34,5 @@ add_executable(wrapped_tests ${wrapped_tests} ${support} support/systemcalls.cpp
 target_include_directories(wrapped_tests PRIVATE support)
 target_link_libraries(wrapped_tests PRIVATE orvpatch_core GTest::gmock GTest::gtest_main)
 target_link_options(wrapped_tests PRIVATE ${wrap_options})
+orvpatch_test_code(wrapped_tests)
 target_precompile_headers(wrapped_tests REUSE_FROM unit_tests)
