@@ -134,14 +134,15 @@ std::vector<std::string> FakeHome::journal() const {
   return lines;
 }
 
-LogLines FakeHome::expectFailure(const std::function<bool(PatchError *)> &operation, const Record &expected) {
+LogLines FakeHome::expectFailure(const std::string &component, const Record &expected,
+                                 const std::function<bool(PatchError *)> &operation) {
   logLines();
   PatchError err{99, "of an earlier failure"};
   EXPECT_FALSE(operation(&err));
   EXPECT_EQ(recordOf(err), expected);
-  const LogLines lines = withoutPointers(logLines());
+  const LogLines lines = logLinesOf(component);
   EXPECT_FALSE(operation(nullptr));
-  EXPECT_EQ(withoutPointers(logLines()), lines) << "without a record the log must read the same";
+  EXPECT_EQ(logLinesOf(component), lines) << "without a record the log must read the same";
   return lines;
 }
 

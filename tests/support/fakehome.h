@@ -62,8 +62,9 @@ public:
   std::vector<std::string> journal() const;
 
   /// Runs an operation that must fail, over whatever the record held, and once more without a record, which
-  /// must fail with the same lines in the log. Returns these lines.
-  LogLines expectFailure(const std::function<bool(PatchError *)> &operation, const Record &expected);
+  /// must fail with the same lines of this component in the log. Returns these lines.
+  LogLines expectFailure(const std::string &component, const Record &expected,
+                         const std::function<bool(PatchError *)> &operation);
 
 protected:
   void SetUp() override;

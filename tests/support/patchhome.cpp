@@ -56,6 +56,9 @@ PatchHome::Processor PatchHome::loaded(const std::string &fileName, const std::s
 LogLine pp(const std::string &message) {
   return trace("patchprocessor", message);
 }
+LogLines pps(const std::vector<std::string> &messages) {
+  return traces("patchprocessor", messages);
+}
 LogLine ppInfo(const std::string &message) {
   return info("patchprocessor", message);
 }

@@ -1,6 +1,7 @@
 // A home with patches for it: descriptors, real archives, and processors ready for one operation.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <vector>
@@ -42,9 +43,14 @@ public:
 
   /// What the processors logged since the log was read last.
   LogLines ownLines() { return logLinesOf("patchprocessor"); }
+  /// A failure of the patch processor; see FakeHome::expectFailure.
+  LogLines expectOwnFailure(const Record &expected, const std::function<bool(PatchError *)> &operation) {
+    return expectFailure("patchprocessor", expected, operation);
+  }
 };
 
 /// Log lines of the patch processor.
 LogLine pp(const std::string &message);
+LogLines pps(const std::vector<std::string> &messages);
 LogLine ppInfo(const std::string &message);
 LogLine ppError(const std::string &message);

@@ -125,19 +125,19 @@ TEST_F(DescriptorTest, FullDescriptorIsTracedFromEndToEnd) {
 
 TEST_F(DescriptorTest, UnreadableFileIsReportedByTheLayerBelow) {
   const std::string path = home() + "missing.ini";
-  const LogLines lines =
-      expectFailure([&](PatchError *err) { return PatchDescriptor::parseFile(path, err) != nullptr; },
-                    {5, "Unable to read file [" + path + "]: No such file or directory"});
-  EXPECT_EQ(linesOf("patchdescriptor.cpp", lines), own({"PatchDescriptor::parseFile(" + path + ") entry"}));
+  const LogLines lines = expectFailure(
+      "patchdescriptor.cpp", {5, "Unable to read file [" + path + "]: No such file or directory"},
+      [&](PatchError *err) { return PatchDescriptor::parseFile(path, err) != nullptr; });
+  EXPECT_EQ(lines, own({"PatchDescriptor::parseFile(" + path + ") entry"}));
 }
 
 TEST_F(DescriptorTest, MissingProductInfoIsCode6AndLoggedAsAParseErrorOnly) {
   const std::string path = write("patch.ini", "[PreReqs]\nox = 061000\n");
   const LogLines lines =
-      expectFailure([&](PatchError *err) { return PatchDescriptor::parseFile(path, err) != nullptr; },
-                    {6, "Missing required section: ProductInfo"});
+      expectFailure("patchdescriptor.cpp", {6, "Missing required section: ProductInfo"},
+                    [&](PatchError *err) { return PatchDescriptor::parseFile(path, err) != nullptr; });
   EXPECT_EQ(
-      linesOf("patchdescriptor.cpp", lines),
+      lines,
       joined({own({"PatchDescriptor::parseFile(" + path + ") entry", Parsing, "PatchDescriptor::parse = 0"}),
               {error("patchdescriptor.cpp", "Error parsing patch file")},
               own({"PatchDescriptor::~PatchDescriptor entry",
