@@ -10,7 +10,7 @@ import subprocess
 from pathlib import Path
 from typing import NamedTuple
 
-from .scratch import scratch_folder
+from .scratch import remove_tree, scratch_folder
 
 _CHECKOUT = Path(__file__).resolve().parents[2]
 
@@ -47,7 +47,7 @@ class Program:
             return self.argv
         if self._copy is None:
             folder = scratch_folder()
-            atexit.register(shutil.rmtree, folder)
+            atexit.register(remove_tree, folder)
             self._copy = shutil.copy(self.binary, folder)
         return [*self.runner, self._copy]
 

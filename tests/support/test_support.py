@@ -8,7 +8,7 @@ import time
 
 import pytest
 
-from support import Patch, Program, parse_log, second_account, stubs
+from support import Patch, Program, parse_log, remove_tree, scratch_folder, second_account, stubs
 
 
 def alive(pid):
@@ -143,6 +143,17 @@ def test_rows_that_tell_nothing_are_passed_over(home):
     assert home.instances() == [("ox", "")]
     home.run_info = "no separator\nhost|yn|1|None|x\n"
     assert home.rows() == []
+
+
+def test_closed_and_very_deep_directories_are_removed():
+    folder = scratch_folder()
+    (folder / "closed/inner").mkdir(parents=True)
+    (folder / "closed/inner").chmod(0)
+    (folder / "closed").chmod(0)
+    dig = "import os\nfor _ in range(3000):\n    os.mkdir('d')\n    os.chdir('d')"
+    subprocess.run(["/usr/bin/python3", "-c", dig], cwd=folder, check=True)
+    remove_tree(folder)
+    assert not folder.exists()
 
 
 def members(archive):
