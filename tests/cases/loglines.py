@@ -154,14 +154,25 @@ def is_running(pid):
 def start_agent(home, words, instance="", outcome=()):
     """`words`: all that follows the script's name and one blank; `outcome`: the lines after the call."""
     return around("orvcomponent", f"startInstance({instance})",
-                  run_command("/bin/sh", "-c", f"{home.prefix}bin/QuillAgent {words}"),
-                  outcome or called(), end=f"startInstance({instance}) exit")
+                  run_command("/bin/sh", "-c", f"{home.prefix}bin/QuillAgent {words}"), outcome or called())
 
 
 def stop_agent(home, *words, instance="", outcome=()):
     return around("orvcomponent", f"stopInstance({instance})",
-                  run_command(f"{home.prefix}bin/QuillAgent", *words), outcome or called(),
-                  end=f"stopInstance({instance}) exit")
+                  run_command(f"{home.prefix}bin/QuillAgent", *words), outcome or called())
+
+
+def start_server(home, instance="", outcome=()):
+    return _run_server(home, "start", instance, outcome)
+
+
+def stop_server(home, instance="", outcome=()):
+    return _run_server(home, "stop", instance, outcome)
+
+
+def _run_server(home, verb, instance, outcome):
+    return around("orvcomponent", f"{verb}Instance({instance})",
+                  run_command(f"{home.prefix}bin/QuillServer", verb, instance), outcome or called())
 
 
 def called(status=0, out="", err=""):

@@ -5,7 +5,7 @@ import os
 from catalogue import text
 from loglines import (around, error, info, joined, link_into_place, list_directory, look_up, make_directory,
                       parse_descriptor, path_exists, read_lines, read_missing_lines, remove_tree, run_command,
-                      stop_agent, trace)
+                      stop_agent, stop_server, trace)
 from productsite import SEARCH_PATH
 
 PATCH = "patchprocessor"
@@ -127,8 +127,10 @@ class PatchLines:
                       end="PatchProcessor::printDependentsList = 1")
 
     def stopped(self, instance, *words):
-        return joined(trace(PATCH, f"Attempting to stop instance [{instance}]"),
-                      stop_agent(self.site_home, *words, instance=instance),
+        """`words`: arguments of the agents' control script; none for the server's."""
+        stop = (stop_agent(self.site_home, *words, instance=instance) if words
+                else stop_server(self.site_home, instance))
+        return joined(trace(PATCH, f"Attempting to stop instance [{instance}]"), stop,
                       trace(PATCH, f"Adding instance [{instance}] to the list of stopped agents"))
 
     # --- command lists ---------------------------------------------------------------------------------

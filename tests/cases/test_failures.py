@@ -5,6 +5,9 @@ the order ox, ul, yn and starts in the order ul, yn, with ox after everything el
 """
 
 import os
+import shutil
+import tempfile
+from pathlib import Path
 from typing import NamedTuple
 
 import pytest
@@ -187,6 +190,20 @@ def test_files_before_the_failing_one_stay_moved(site):
         "+ tmp/kyn/updated_files/tool"]
 
 
+def test_files_are_never_copied_to_another_file_system(site):
+    other = Path(tempfile.mkdtemp(dir="/dev/shm"))
+    if other.stat().st_dev == site.home.path.stat().st_dev:
+        pytest.skip("no second file system here")
+    site.home.remove("tmp")
+    (site.home.path / "tmp").symlink_to(other)
+    target = f"{site.home.prefix}./tool"
+    message = text("ERROR_PP_MOVE_FILE", f"{other}/kyn/updated_files/./tool", target)
+    result = site.install(Patch("yn").file("tool"))
+    shutil.rmtree(other)
+    assert result == site.failed(25, message)
+    assert f"unable to link: ./tool to {target}. Invalid cross-device link" in site.logged("TRACE")
+
+
 def test_the_next_attempt_begins_with_an_empty_directory(site):
     site.home.mkdir("bin/tool")
     site.install(patch_of_yn())
@@ -257,6 +274,14 @@ def test_a_working_directory_that_a_command_removes(site):
     path = site.target(Patch("yn").script("go.sh", "pre_patch", body=f"rmdir {own}"))
     assert site.install(path, cwd=own) == site.failed(22, text("ERROR_PP_SET_CWD", own))
     assert site.home.calls() == ["go.sh"]
+
+
+def test_after_a_failed_command_path_and_directory_are_the_old_ones(site):
+    site.home.start("ox")
+    patch = Patch("yn", dependents=["ox"]).script("go.sh", "pre", status=1)
+    site.install(patch, cwd="/usr", env={"PATH": "/usr/bin:/bin"})
+    assert [(str(call), call.cwd, call.path) for call in site.home.journal()[-1:]] == [
+        ("QuillAgent start ox", "/usr", "/usr/bin:/bin")]
 
 
 # --- control scripts -----------------------------------------------------------------------------------
@@ -341,6 +366,15 @@ def test_a_failed_clean_up_does_not_fail_the_installation(site, elsewhere):
     assert site.logged("ERROR") == [message, message]  # before and after
     assert site.home.read(RESULT_FILE) == b"27"        # but its code is what the OS agent is told
     assert (elsewhere / "kept").exists()
+
+
+def test_a_stray_line_is_what_the_os_agent_is_told(site):
+    # With both optional properties there is nothing that would reset the record of a descriptor that was read.
+    site.home.start("ox")
+    stray = "stray\n" + Patch("ox", exe="x").descriptor_text()
+    assert site.install(Patch("ox", descriptor=stray)) == site.done()
+    assert site.home.read(RESULT_FILE) == b"4"
+    assert [entry.result for entry in site.home.history()] == ["PASS"]
 
 
 def test_a_failed_clean_up_gives_a_report_without_files_its_code(site, elsewhere):

@@ -3,6 +3,7 @@
 import os
 import pwd
 import re
+from concurrent.futures import ThreadPoolExecutor
 
 import pytest
 
@@ -61,6 +62,16 @@ def test_each_run_adds_to_the_same_file(site):
     assert log.preamble == "an older line\n"
     assert [len(run.lines) for run in log.runs] == [len(validation_lines(site, path))] * 2
     assert log.runs[0].header.pid != log.runs[1].header.pid
+
+
+def test_lines_of_runs_side_by_side_stay_whole(site):
+    path = site.descriptor(VALID)
+    with ThreadPoolExecutor() as pool:
+        results = [pool.submit(site.program.validate, site.home, path) for _ in range(6)]
+    assert {result.result().status for result in results} == {0}
+    logged = HEADER.sub("", site.home.read("patchlogs/orvpatch.log").decode())
+    assert sorted(without_times(logged).splitlines()) == sorted(
+        as_printed(validation_lines(site, path)).splitlines() * 6)
 
 
 def test_a_missing_folder_is_made(site):

@@ -6,7 +6,8 @@ from support import Patch
 
 from catalogue import text
 from loglines import (Found, around, expect, info, joined, level, list_directory, look_up, parse_bad_descriptor,
-                      parse_descriptor, parse_missing_ini, registry, run_command, start_agent, stop_agent, trace)
+                      parse_descriptor, parse_missing_ini, registry, run_command, start_agent, start_server,
+                      stop_agent, trace)
 from patchlines import (PACKAGE, PATCH, PatchLines, done, installing, nothing_happens, package, package_destroyed,
                         reported, run, single_file, sorted_processors)
 
@@ -137,6 +138,33 @@ def test_an_installation_with_all_as_dependents(site):
             lines.scripts("runPostScripts"), lines.version_updated(),
             done("startDependents", look_up(), trace(PATCH, "Attempting to start instance []"),
                  start_agent(home, " start ul")),
+            lines.os_agent(), lines.recorded()), lines.cleaned_up()),
+        package_destroyed(lines.destroyed())), 0)
+
+
+def test_an_installation_around_a_server(site):
+    home = site.home
+    home.component("yn")
+    home.component("qa")
+    home.start("qa")
+    home.start("qa", "hub")
+    path = site.target(Patch("yn", dependents=["kqa"]))
+    lines = PatchLines(home, path, "kyn")
+    found = registry(home, {"ynlpp266.ver": Found(), "qalpp266.ver": Found(tuple(row.pid for row in home.rows()))})
+    expect(site, ["-i", path, "-h", home.path], installing(
+        path,
+        package(path, home, single_file(path),
+                lines.accepted(lines.initialized("Dependents"), lines.prerequisites(found))),
+        run(lines.cleaned_up(), done(
+            "run", lines.extracted(), lines.scripts("runPrePatchScripts"),
+            done("stopDependents", look_up(), lines.stopped(""), lines.stopped("hub"),
+                 trace(PATCH, "Stopped 2 instance(s) of kqa"),
+                 look_up(), trace(PATCH, "No running instances of kyn found")),
+            lines.scripts("runPreScripts"), lines.no_files(), nothing_happens("updateProductEXEFiles"),
+            lines.scripts("runPostScripts"), lines.version_updated(),
+            done("startDependents", look_up(),
+                 trace(PATCH, "Attempting to start instance []"), start_server(home),
+                 trace(PATCH, "Attempting to start instance [hub]"), start_server(home, "hub")),
             lines.os_agent(), lines.recorded()), lines.cleaned_up()),
         package_destroyed(lines.destroyed())), 0)
 

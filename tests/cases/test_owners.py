@@ -8,6 +8,7 @@ import pytest
 from support import Patch, stubs
 
 from catalogue import text
+from loglines import error, joined, trace
 
 
 @pytest.fixture
@@ -82,6 +83,10 @@ def test_others_cannot_start_an_agent_of_another_user(ordinary):
     assert ordinary.home.calls() == ["QuillAgent stop yn"]
     assert [entry.result for entry in ordinary.home.history()] == ["FAIL"]
     assert ordinary.home.level("yn") == "06100100" and ordinary.home.exists("bin/tool")
+    log = ordinary.log()
+    begin = log.index(("TRACE", "orvcomponent", "startInstance() entry"))
+    assert log[begin + 1:begin + 3] == joined(
+        error("orvcomponent", text("ERROR_START_CANT_SU", "root")), trace("orvcomponent", "startInstance() exit"))
 
 
 def test_others_cannot_start_the_os_agent_of_another_user(ordinary):
