@@ -6,7 +6,7 @@ import subprocess
 from dataclasses import dataclass
 from typing import Callable
 
-TOOL, FLOOR = "orvpatch", "floor"
+TOOL, FLOOR, FLOOR_AT = "orvpatch", "floor", "floor, short names"
 _CONTROL = "Package: {name}\nVersion: 1\nArchitecture: all\nMaintainer: nobody <nobody@localhost>\nDescription: x\n"
 _SPEC = """Name: {name}
 Version: 1

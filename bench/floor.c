@@ -1,6 +1,6 @@
 // The floor under an installation: the work that its design asks for, and nothing else.
 //
-//   floor install|report HOME VERSION-FILE FILES LINES BYTES ARCHIVE...
+//   floor install|install-at|report HOME VERSION-FILE FILES LINES BYTES ARCHIVE...
 //
 // First, for every archive: extract the descriptor. Then, archive by archive: remove what is in the temporary
 // directory, extract everything, put it on disk, look at each entry of the tree, link it to its place under
@@ -8,6 +8,10 @@
 // append to the history with an fsync each, remove the temporary tree. A report prints the places and moves
 // nothing. Spread over the FILES files, LINES log lines of BYTES bytes in all are written, each by one open,
 // one write and one close.
+//
+// install-at keeps the home and the log's directory open and names files from there, which spares the system
+// the way down to them. The design does not do so: another process may put a new directory in the place of
+// one that is kept open. It shows what that costs.
 //
 // No message is put together, no failure is survived, entries are taken in the order of the system: whatever
 // a program does above this is its own. HOME ends in "/"; all paths are absolute.
@@ -26,6 +30,10 @@
 // two names of a file that moves are thus made at once, by one copy of its last component.
 static char path[PATH_MAX];
 static char *below;
+
+// The place under the home of the file that moves, and the log: what to start from, and the name from there.
+static int homeDirectory = AT_FDCWD, logDirectory = AT_FDCWD;
+static const char *target = path, *logName;
 
 static char temporary[PATH_MAX];
 static char logFile[PATH_MAX];
@@ -51,8 +59,15 @@ static void placeTemporary(const char *home, int number) {
   place(temporary, home, name);
 }
 
-static void writeTo(const char *file, int flags, const char *text, size_t length, int (*flush)(int)) {
-  const int descriptor = open(file, O_WRONLY | O_CREAT | O_CLOEXEC | flags, 0666);
+static int openDirectory(const char *name) {
+  const int directory = open(name, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  check(directory >= 0, name);
+  return directory;
+}
+
+static void writeTo(int directory, const char *file, int flags, const char *text, size_t length,
+                    int (*flush)(int)) {
+  const int descriptor = openat(directory, file, O_WRONLY | O_CREAT | O_CLOEXEC | flags, 0666);
   check(descriptor >= 0 && write(descriptor, text, length) == (ssize_t)length, file);
   if (flush != NULL)
     check(flush(descriptor) == 0, file);
@@ -65,7 +80,7 @@ static void writeLines(void) {
   for (size_t share = linesLeft / filesLeft--; share > 0; --share) {
     const size_t length = bytesLeft / linesLeft--;
     bytesLeft -= length;
-    writeTo(logFile, O_APPEND, text, length, NULL);
+    writeTo(logDirectory, logName, O_APPEND, text, length, NULL);
   }
 }
 
@@ -127,14 +142,14 @@ static void makeDirectory(void) {
 
 static void moveFile(void) {
   struct stat old;
-  if (stat(path, &old) == 0)
-    check(unlink(path) == 0, path);
+  if (fstatat(homeDirectory, target, &old, 0) == 0)
+    check(unlinkat(homeDirectory, target, 0) == 0, path);
   else
     old = (struct stat){.st_mode = 0755, .st_uid = (uid_t)-1, .st_gid = (gid_t)-1};
-  check(link(below, path) == 0, path);
+  check(linkat(AT_FDCWD, below, homeDirectory, target, 0) == 0, path);
   check(unlink(below) == 0, below);
-  check(chown(path, old.st_uid, old.st_gid) == 0, path);
-  check(chmod(path, old.st_mode & 07777) == 0, path);
+  check(fchownat(homeDirectory, target, old.st_uid, old.st_gid, 0) == 0, path);
+  check(fchmodat(homeDirectory, target, old.st_mode & 07777, 0) == 0, path);
   writeLines();
 }
 
@@ -163,23 +178,32 @@ static void rewriteVersionFile(void) {
   const ssize_t length = file < 0 ? -1 : read(file, text, sizeof text);
   check(length > 0, versionFile);
   close(file);
-  writeTo(versionFile, O_TRUNC, text, (size_t)length, fsync);
+  writeTo(AT_FDCWD, versionFile, O_TRUNC, text, (size_t)length, fsync);
 }
 
 static void install(void) {
   static const struct visitor moving = {makeDirectory, moveFile, nothing};
   static const char line[] = "code | platform | kind | name of the patch    | PASS | user | date\n";
-  const int directory = open(temporary, O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  check(directory >= 0 && syncfs(directory) == 0, temporary);
+  const int directory = openDirectory(temporary);
+  check(syncfs(directory) == 0, temporary);
   close(directory);
   walkFrom("updated_files", &moving);
   rewriteVersionFile();
-  writeTo(history, O_APPEND, line, strlen(line), fsync);
+  writeTo(AT_FDCWD, history, O_APPEND, line, strlen(line), fsync);
 }
 
 static void report(void) {
   static const struct visitor listing = {nothing, listFile, nothing};
   walkFrom("updated_files", &listing);
+}
+
+static void nameFromDirectories(const char *home) {
+  char logs[PATH_MAX];
+  place(logs, home, "patchlogs");
+  homeDirectory = openDirectory(home);
+  target = below;
+  logDirectory = openDirectory(logs);
+  logName = "orvpatch.log";
 }
 
 static size_t numberOf(const char *text) {
@@ -188,17 +212,20 @@ static size_t numberOf(const char *text) {
 
 int main(int argc, char **argv) {
   check(argc > 7, "arguments");
-  const int installing = strcmp(argv[1], "install") == 0;
+  const int installing = strcmp(argv[1], "report") != 0;
   const char *const home = argv[2];
   place(path, home, "");
   below = path + strlen(path);
   place(logFile, home, "patchlogs/orvpatch.log");
+  logName = logFile;
   place(history, home, "patchlogs/patches.hist");
   versionFile = argv[3];
   filesLeft = numberOf(argv[4]);
   linesLeft = numberOf(argv[5]);
   bytesLeft = numberOf(argv[6]);
 
+  if (strcmp(argv[1], "install-at") == 0)
+    nameFromDirectories(home);
   for (int i = 7; i < argc; ++i) {
     placeTemporary(home, i);
     extract(argv[i], "patch.ini");

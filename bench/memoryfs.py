@@ -29,10 +29,10 @@ def memory_folder(mebibytes):
 def _mount_image(stack, mebibytes):
     if os.geteuid() != 0:
         raise PermissionError("mounting needs root")
-    memory = Path(stack.enter_context(tempfile.TemporaryDirectory(prefix="orvpatch-bench-")))
+    memory, folder = (Path(stack.enter_context(tempfile.TemporaryDirectory(prefix="orvpatch-bench-")))
+                      for _ in range(2))
     _mount(stack, memory, "-t", "tmpfs", "-o", f"size={mebibytes + 64}m", "tmpfs")
-    image, folder = memory / "image", memory / "fs"
-    folder.mkdir()
+    image = memory / "image"
     with image.open("wb") as file:
         file.truncate(mebibytes << 20)
     # Nothing is left to be initialised by the kernel while the figures are taken.

@@ -53,14 +53,16 @@ PAYLOADS = (
 class Laid:
     """A payload on disk:
 
-    patches/   the patch files                       trees/NNN/  the files of each patch, as under the home
-    template/  the home before the installation      home/       a copy of it, for one run
-    packages/  what the peers take
+    home/               the home of one run: a copy of the template; not far from the root, as homes are
+    payload/template/   the home before the installation
+    payload/patches/    the patch files
+    payload/trees/NNN/  the files of each patch, as under the home
+    payload/packages/   what the peers take
     """
 
     def __init__(self, payload, folder):
-        self.payload, self.folder = payload, Path(folder)
-        self.template, self.home = self.folder / "template", self.folder / "home"
+        self.payload, self.folder = payload, Path(folder, "payload")
+        self.template, self.home = self.folder / "template", Path(folder, "home")
         self.patches, self.trees, self._packages = [], [], {}
         self._lay_out_template()
         self._write_patches()
@@ -105,6 +107,7 @@ class Laid:
 
     def remove(self):
         shutil.rmtree(self.folder)
+        shutil.rmtree(self.home)
 
     def _lay_out_template(self):
         home = ProductHome(self.template)
@@ -115,7 +118,7 @@ class Laid:
     def _write_patches(self):
         chosen = random.Random(self.payload.files)  # the same bytes in every run
         folder = self.folder / "patches"
-        folder.mkdir()
+        folder.mkdir(parents=True)
         each = self.payload.files // self.payload.patches
         for number, code in enumerate(self.payload.codes()):
             patch = Patch(code)

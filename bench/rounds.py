@@ -3,7 +3,7 @@
 import os
 from dataclasses import dataclass, field
 
-from contenders import FLOOR, PEERS, TOOL
+from contenders import FLOOR, FLOOR_AT, PEERS, TOOL
 from payloads import Laid
 
 
@@ -28,7 +28,7 @@ class Bench:
     def trial(self, payload, rounds, progress):
         """Lays the payload out, measures everybody on it `rounds` times, and removes it again."""
         trial = Trial(payload)
-        laid = Laid(payload, self._folder / payload.key)
+        laid = Laid(payload, self._folder)
         commands = self._commands(laid, trial)
         for name, command in commands.items():
             self._run(laid, command)
@@ -49,13 +49,14 @@ class Bench:
         tool = [self._tool, "-h", laid.home, trial.payload.action, laid.path]
         self._run(laid, tool)
         trial.log_lines, trial.log_bytes = laid.log_size()
-        return {TOOL: tool, FLOOR: self._floor_command(laid, trial), **peers}
+        return {TOOL: tool, **self._floor_commands(laid, trial), **peers}
 
-    def _floor_command(self, laid, trial):
+    def _floor_commands(self, laid, trial):
         # As many log lines as the tool has just written, and as many bytes in them.
-        action = "install" if trial.payload.action == "-i" else "report"
-        return [self._floor, action, f"{laid.home}/", laid.version_file, str(trial.payload.files),
-                str(trial.log_lines), str(trial.log_bytes), *laid.patches]
+        words = [f"{laid.home}/", laid.version_file, trial.payload.files, trial.log_lines, trial.log_bytes,
+                 *laid.patches]
+        actions = {FLOOR: "install", FLOOR_AT: "install-at"} if trial.payload.action == "-i" else {FLOOR: "report"}
+        return {name: [self._floor, action, *map(str, words)] for name, action in actions.items()}
 
     @staticmethod
     def _peer_commands(laid, trial):
