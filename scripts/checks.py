@@ -90,6 +90,19 @@ def units(preset, program="unit_tests", env=None, runner=()):
                  [f"build-{preset}"], env, tests=True)
 
 
+def units_as_ordinary_user(preset):
+    """What permissions forbid does not bind root: as root, the unit tests run once more as nobody."""
+    name = f"units-as-nobody-{preset}"
+    report = RESULTS / f"{name}.1.xml"
+    script = ("folder=$(mktemp -d) && chmod 755 $folder && install -m 755 $0/unit_tests $folder && "
+              "mkdir -m 777 $folder/scratch && cd / && status=0 && "
+              "TMPDIR=$folder/scratch setpriv --reuid=65534 --regid=65534 --clear-groups $folder/unit_tests "
+              "--gtest_brief=1 --gtest_output=xml:$folder/scratch/report.xml || status=$?; "
+              "cp $folder/scratch/report.xml $1 && rm -rf $folder && exit $status")
+    return Stage(name, [["bash", "-c", script, f"{ROOT}/build/{preset}/tests", report]], [f"build-{preset}"],
+                 tests=True)
+
+
 def cases(name, paths, preset="dev", env=None, options=(), jobs=2):
     report = RESULTS / f"{name}.1.xml"
     present = [path for path in paths if (ROOT / path).exists()]
@@ -120,8 +133,9 @@ EMULATED = {"ORVPATCH_RUNNER": "qemu-ppc64le -L /usr/powerpc64le-linux-gnu"}
 
 
 def native_stages():
+    as_nobody = [units_as_ordinary_user("dev")] if os.geteuid() == 0 else []
     return [build("dev"), build("release"), *static_stages(), units("dev"), units("dev", "wrapped_tests"),
-            cases("cases", PROGRAM_TESTS)]
+            *as_nobody, cases("cases", PROGRAM_TESTS), Stage("demo", [["scripts/demo"]], ["build-release"])]
 
 
 def sanitized_stages():
