@@ -94,6 +94,7 @@ def test_a_path_is_shown_as_it_was_given(site):
 
 
 def test_the_verdict_is_logged_as_information(site):
+    # KEEP(verdict-at-info): that of a failure too.
     site.validate(VALID)
     assert site.log()[-2:] == [("INFO", "main", text("MAIN_SUCCESSFUL")), ("TRACE", "main", "main = 0")]
     folder = f"{site.home.prefix}patchlogs/"
@@ -105,6 +106,7 @@ def test_the_verdict_is_logged_as_information(site):
 
 @pytest.mark.parametrize("first", ["-h", "x", "-t", ""])
 def test_the_self_check_always_succeeds(site, first):
+    # KEEP(utest-success): what it finds goes to the error output alone.
     result = site.run(first, site.home, "-utest")
     rule = "-" * 40
     banner = f"{rule}\n- Testing patchProcesser API's\n{rule}\n"

@@ -109,6 +109,7 @@ def test_a_client_patch_stops_nothing(site, code, target):
 
 
 def test_the_os_agent_is_started_once_as_its_default_instance(site):
+    # KEEP(osagent-default-instance)
     site.home.component("ox")
     site.home.start("ox", "one")
     site.home.start("ox", "two")

@@ -94,6 +94,7 @@ def in_listing_order(site, *products):
 
 @pytest.mark.parametrize("action", ["-i", "-t"])
 def test_the_first_that_fails_in_loading_is_reported_as_no_applicable_patch(site, action):
+    # KEEP(no-applicable-overwrites)
     first, second = in_listing_order(site, "ox", "yn")
     Patch(first, prereqs={"ho": "06.10.00"}).write(site.patch_dir)
     message = text("ERROR_DCFPP_NO_APPLICABLE", site.patch_dir)

@@ -219,19 +219,20 @@ def test_a_failure_of_the_os_agent_replaces_an_earlier_one(site):
     patch = patch_of_yn().script("2_stopped.sh", "pre", status=1)
     assert site.install(patch) == site.failed(12, text("ERROR_START_AGENT", OX))
     assert site.home.read(RESULT_FILE) == b"21"
+    # KEEP(osagent-wording): said also when an earlier step has failed.
     wording = "Patch seems to be successfully applied. However, the OS agent could not be restarted"
     assert wording in site.logged("TRACE")
 
 
 # --- commands ------------------------------------------------------------------------------------------
 
-COMMANDS = {  # list -> code; the list's own code takes the place of any other
-    "pre_patch": 22, "pre": 21, "post": 23,
-}
+# KEEP(script-code-replaced): whatever goes wrong in a list, the code is the list's.
+COMMANDS = {"pre_patch": 22, "pre": 21, "post": 23}
 
 
 @pytest.mark.parametrize("when, status", COMMANDS.items())
 def test_a_command_that_is_not_there(site, when, status):
+    # KEEP(command-is-program): its arguments are taken for a part of its name.
     patch = Patch("yn").command(when, "absent.sh --word")
     assert site.install(patch) == site.failed(status, text("PROC_BAD_RC", "absent.sh --word", 2))
     assert site.logged("ERROR") == [
@@ -254,7 +255,7 @@ def test_the_first_failing_command_ends_its_list(site, when, status):
 
 
 def test_a_command_that_is_killed_counts_as_successful(site):
-    # The status of a child that a signal has ended holds no exit status: its place is zero.
+    # KEEP(signal-is-zero): the status of a child that a signal has ended holds no exit status.
     assert site.install(Patch("yn").script("go.sh", "pre", body="kill -9 $$")) == site.done()
     assert text("PP_SCRIPT_COMPLETE", "go.sh") in site.logged("INFO")
 
@@ -359,6 +360,7 @@ def elsewhere(site):
 
 
 def test_a_failed_clean_up_does_not_fail_the_installation(site, elsewhere):
+    # KEEP(cleanup-unchecked)
     (elsewhere / "kept").touch()
     site.home.start("ox")
     message = text("ERROR_PP_RM_DIR", f"{site.home.prefix}tmp/kyn")

@@ -235,7 +235,7 @@ def test_which_version_file_is_written(site, code, target, filename):
 
 
 def test_the_command_line_component_is_recorded_under_its_own_name(site):
-    # Whatever product a vecm patch is for, the level is written to the "zt" file.
+    # KEEP(vecm-zt-file): whatever product the patch is for, the level is written to the "zt" file.
     site.home.component("zt")
     site.home.component("ox")
     patch = Patch("ox", target="vecm", code="zt")

@@ -72,7 +72,7 @@ SERVER, PORTAL, CLIENT = "config/.ConfigData/kqaenv", "registry/ptlpp266.ver", "
     ("qa", "vems", SERVER, "registry/qalpp266.ver", "VEMS"),
     ("xe", "vems", SERVER, "registry/xevms.ver", "VEMS"),
     ("xe", "veps", PORTAL, "registry/xevps.ver", "VEPS"),
-    ("xe", "vepd", CLIENT, "registry/xevpd.ver", "VEPS"),  # the portal's words
+    ("xe", "vepd", CLIENT, "registry/xevpd.ver", "VEPS"),  # KEEP(vepd-veps-words): the portal's
     ("xe", "vema", None, "registry/xelpp266.ver", "VEMA"),
     ("XE", "vecm", None, "registry/xelpp266.ver", "VECM"),
     ("pt", "veps", None, PORTAL, None),
@@ -222,6 +222,7 @@ def test_an_instance_that_does_not_stop(site, patched):
 def test_a_file_that_cannot_be_moved(site, patched):
     path, lines = patched(Patch("yn").file("tool"))
     site.home.mkdir("tool")
+    # KEEP(movefiles-exit-name): the last line of the step names moveFile, like those of its entries.
     target, source = f"{site.home.prefix}./tool", f"{lines.sources}/./tool"
     not_applied(site, path, lines, *lines.steps_up_to_files(),
                 lines.moved_files(lines.directory(lines.not_moved(source, target, "File exists")), result=0),

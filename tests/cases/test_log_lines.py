@@ -213,6 +213,7 @@ def console_looked_for(home):
 
 
 def test_a_report_on_nothing(site):
+    # KEEP(testpatch-entry): the first line has "entry" where the last one has the path.
     expect(site, ["-t", "/dev/null", "-h", site.home.path], joined(
         trace("main", "testPatch(entry)", "Creating Package Processor object with path [/dev/null]"),
         package("/dev/null", site.home),

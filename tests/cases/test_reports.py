@@ -110,6 +110,7 @@ def test_a_command_is_cut_at_its_equal_sign(site):
 
 
 def test_without_files_the_report_ends_early_and_prints_an_empty_error(site):
+    # KEEP(list-no-files-false) and KEEP(record-is-status): a failure that has no code ends with status 0.
     site.home.start("ox")
     path = site.target(Patch("ox", post=["never shown"]))
     expected = head(path) + NO_PRE_PATCH + STOPPED + f"    {OX}\n\n" + NO_PRE + "\n"
@@ -219,6 +220,7 @@ def test_the_code_of_a_stray_line_is_that_of_a_report_without_files(site):
 
 
 def test_files_that_are_no_directory(site):
+    # KEEP(testpatch-one-newline)
     path = site.target(Patch("ox").member("updated_files"))
     shown = head(path) + NO_PRE_PATCH + NO_INSTANCES + NO_PRE + "\n"
     message = text("ERROR_PP_SET_CWD", f"{site.home.prefix}tmp/kox/updated_files")
