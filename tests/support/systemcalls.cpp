@@ -169,9 +169,12 @@ ssize_t __wrap_write(int descriptor, const void *buffer, size_t size) {
   return fails("write") ? -1 : __real_write(descriptor, buffer, std::min(size, state().transferLimit));
 }
 
-// A close that fails has closed the descriptor all the same.
+// A close that is made to fail has closed the descriptor all the same. One that fails by itself was given
+// what is not open: closed twice, or never opened.
 int __wrap_close(int descriptor) {
   const int result = __real_close(descriptor);
+  if (result != 0)
+    state().journal.push_back({"close of nothing", std::to_string(descriptor)});
   return fails("close") ? -1 : result;
 }
 

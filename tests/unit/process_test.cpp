@@ -230,16 +230,40 @@ TEST_F(ProcessTest, EnvironmentAndDirectoryAreInherited) {
   EXPECT_EQ(result.out, "inherited\n" + home() + "\n" + home() + "work\n");
 }
 
+/// Another standard input, or none, for the time of a scope.
+class StandardInputScope {
+public:
+  StandardInputScope() : before_(fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 3)) { close(STDIN_FILENO); }
+  explicit StandardInputScope(const std::string &path) : StandardInputScope() {
+    EXPECT_EQ(open(path.c_str(), O_RDONLY), STDIN_FILENO);
+  }
+  StandardInputScope(const StandardInputScope &) = delete;
+  StandardInputScope &operator=(const StandardInputScope &) = delete;
+  ~StandardInputScope() {
+    close(STDIN_FILENO);
+    if (before_ >= 0) {
+      dup2(before_, STDIN_FILENO);
+      close(before_);
+    }
+  }
+
+private:
+  int before_;
+};
+
 TEST_F(ProcessTest, StandardInputIsInherited) {
-  const std::string path = write("input", "from the caller\n");
-  const int before = dup(STDIN_FILENO);
-  const int input = open(path.c_str(), O_RDONLY | O_CLOEXEC);
-  dup2(input, STDIN_FILENO);
-  const CapturedRun result = capture({"cat"});
-  dup2(before, STDIN_FILENO);
-  close(before);
-  close(input);
-  EXPECT_EQ(result.out, "from the caller\n");
+  const StandardInputScope input(write("input", "from the caller\n"));
+  EXPECT_EQ(capture({"cat"}).out, "from the caller\n");
+}
+
+TEST_F(ProcessTest, ClosedStandardInputChangesNothing) {
+  const StandardInputScope none;
+  const std::size_t before = openDescriptors();
+  const CapturedRun result = captureShell("echo out; echo err >&2; exit 5");
+  EXPECT_EQ(result.rc, 5);
+  EXPECT_EQ(result.out, "out\n");
+  EXPECT_EQ(result.err, "err\n");
+  EXPECT_EQ(openDescriptors(), before);
 }
 
 TEST_F(ProcessTest, OtherDescriptorsAreInherited) {

@@ -79,6 +79,16 @@ TEST_F(ProcessFailureTest, ForkThatFailsLeavesNoDescriptor) {
   EXPECT_EQ(openDescriptors(), before);
 }
 
+TEST_F(ProcessFailureTest, NoDescriptorIsClosedTwice) {
+  captureShell(WritesToBoth);
+  EXPECT_EQ(callsOf("close of nothing"), 0);
+  failCall("fork", EAGAIN).times(1);
+  captureShell("true");
+  failCall("pipe", EMFILE).times(1);
+  captureShell("true");
+  EXPECT_EQ(callsOf("close of nothing"), 0);
+}
+
 TEST_F(ProcessFailureTest, CreatePipesSaysYesWhenItCannot) {
   failCall("pipe", EMFILE);
   int outPipe[2] = {7, 7};
