@@ -101,8 +101,8 @@ class Run:
             found = list(self._differences(expected, variant))
             if not found:
                 return
-            problems.append("; ".join(found))
-        raise AssertionError(" | or ".join(problems))
+            problems.append(found)
+        raise AssertionError("; ".join(min(problems, key=len)))
 
     def _faults(self):
         faults, hit = Faults(), self.injection is None

@@ -31,7 +31,9 @@ def output_unread(_, __, faults):
 def user_unknown(context, _, faults):
     """Without a name the user is not the owner of the instance, and not root either."""
     failure = Failure(20, text("ERROR_START_CANT_SU", getpass.getuser()), context.ended)
-    faults.possible.setdefault((context.patch, context.step), failure)
+    failures = faults.possible.setdefault((context.patch, context.step), [])
+    if failure not in failures:
+        failures.append(failure)
 
 
 def directory_lost(_, __, faults):

@@ -35,18 +35,17 @@ class Faults:
         self.level = {}               # patch -> content of the version file
         self.history = {}             # patch -> "absent" or "no header"
         self.directory_lost = False   # the working directory is not the one of the start any more
-        self.possible = {}            # (patch, step) -> Failure that depends on what the C library makes of it
+        self.possible = {}            # (patch, step) -> Failures, one of which the C library may have made of it
         self.unchecked = set()        # "out", "err": streams that have lost something
 
     def variants(self):
-        """These faults with each selection of the possible failures."""
-        places = list(self.possible)
-        for count in range(len(places) + 1):
-            for chosen in itertools.combinations(places, count):
-                variant = copy.deepcopy(self)
-                for place in chosen:
-                    variant.fail(*place, self.possible[place])
-                yield variant
+        """These faults with each selection of the possible failures: none or one in each step."""
+        for chosen in itertools.product(*([None, *failures] for failures in self.possible.values())):
+            variant = copy.deepcopy(self)
+            for place, failure in zip(self.possible, chosen):
+                if failure:
+                    variant.fail(*place, failure)
+            yield variant
 
     def fail(self, patch, step, failure):
         self.steps.setdefault((patch, step), failure)

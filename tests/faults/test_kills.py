@@ -13,7 +13,7 @@ from .scenario import NEW_LEVEL, NEW_MODE
 pytestmark = pytest.mark.faults
 
 PARTS = 10
-SAMPLE = {"install": 24, "report": 8}
+SAMPLE = {"install": 20, "report": 6}
 
 
 @pytest.fixture(scope="module")

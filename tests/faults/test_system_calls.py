@@ -13,7 +13,7 @@ from .scenario import SCENARIOS
 pytestmark = pytest.mark.faults
 
 PARTS = 20
-SAMPLE = {"install": 140, "report": 60, "failure": 80}
+SAMPLE = {"install": 100, "report": 40, "failure": 60}
 
 
 @pytest.fixture(scope="module")
