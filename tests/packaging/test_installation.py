@@ -1,11 +1,11 @@
 """Packages installed into an empty root, and the program in it run on a home of the sample product."""
 
+import shlex
 import subprocess
 
 import pytest
 
-from shipped import AMD64, PPC64LE
-from support import Patch, Program
+from shipped import AMD64, CHECKOUT, PPC64LE
 
 pytestmark = pytest.mark.packages
 
@@ -55,26 +55,17 @@ in_every_way = pytest.mark.parametrize(
 
 
 @in_every_way
-def test_installed_program_patches_a_home(prefix, build, home, patch_dir):
-    home.component("xe", desc="Database Agent")
-    home.component("ox", desc="Agent of the system")
-    home.start("xe", "prod")
-    home.start("ox")
-    home.write("bin/kxeagent", b"old\n")
-    patch = Patch("xe", level="06100001", dependents=["kox"]).file("bin/kxeagent").script("10.sh", when="post")
-    patch.write(patch_dir)
-    running = home.instances()
-    program = Program(prefix / "sbin/orvpatch", build.architecture.runner)
-
-    report = program.report(home, patch_dir)
-    assert (report.status, report.err) == (0, b"")
-    assert f"    {home.path}/bin/kxeagent\n".encode() in report.out
-    assert (home.read("bin/kxeagent"), home.level("xe")) == (b"old\n", "06100000")
-
-    assert program.install(home, patch_dir) == (0, b"\nCommand completed successfully.\n\n", b"")
-    assert (home.read("bin/kxeagent"), home.level("xe")) == (b"new\n", "06100001")
-    assert [line.result for line in home.history()] == ["PASS"]
-    assert home.instances() == running
+def test_installed_program_runs_the_demo(prefix, build, tmp_path):
+    """Report, install, history, refusal and failure on live agents; the demo checks each of them."""
+    program = prefix / "sbin/orvpatch"
+    if build.architecture.runner:
+        program = tmp_path / "emulated/orvpatch"
+        program.parent.mkdir()
+        program.write_text(f'#!/bin/sh\nexec {shlex.join(build.architecture.runner)} {prefix}/sbin/orvpatch "$@"\n')
+        program.chmod(0o755)
+    said = run(CHECKOUT / "scripts/demo", program)
+    assert f"== Using {program}\n" in said
+    assert said.endswith("\n== Everything went as announced\n")
 
 
 @in_every_way
