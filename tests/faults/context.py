@@ -45,7 +45,7 @@ class Context:
         self.step, self.patch, self.when = "start", 0, ""
         self.command, self.ended, self.done_in_command = None, 0, []
         self.component = ""
-        self.looked = False  # whether it has been decided what the given path is
+        self.looked = False  # whether the given path has been looked at, which tells whether it is there
         self.temp_existed = False
         self.listed, self.made = set(), set()
         self.accepted, self.clean_ups, self.removed = [], 0, set()
@@ -67,6 +67,8 @@ class Context:
         for message in call.messages:
             self._read(message)
         path = os.path.normpath(call.path)
+        if call.name == "newfstatat" and path == self.path:
+            self.looked = True
         if call.name == "newfstatat" and path == self.temp and self.step in ("initialize", "extract"):
             self.temp_existed = self.temp_existed or not call.error
         if call.name == "mkdir" and not call.error:
@@ -109,7 +111,6 @@ class Context:
             self.command = None
 
     def _follow_candidate(self, name):
-        self.looked = True
         names = [facts.patch.filename for facts in self.scenario.patches]
         if name in names:
             self.patch = names.index(name)
