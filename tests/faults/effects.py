@@ -2,8 +2,8 @@
 the call and the Faults."""
 
 import errno
-import getpass
 import os
+import pwd
 
 from cases.catalogue import text
 
@@ -30,7 +30,7 @@ def output_unread(_, __, faults):
 
 def user_unknown(context, _, faults):
     """Without a name the user is not the owner of the instance, and not root either."""
-    failure = Failure(20, text("ERROR_START_CANT_SU", getpass.getuser()), context.ended)
+    failure = Failure(20, text("ERROR_START_CANT_SU", pwd.getpwuid(os.getuid()).pw_name), context.ended)
     failures = faults.possible.setdefault((context.patch, context.step), [])
     if failure not in failures:
         failures.append(failure)

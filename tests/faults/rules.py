@@ -179,7 +179,6 @@ RULES = [
     Rule("load", "openat", at_given_path, effects.nothing_listed),
     Rule("load", "getdents64", already_listed, SILENT),
     Rule("load", "getdents64", at_given_path, effects.nothing_listed),
-    Rule("load between", "newfstatat", below_given_path, SILENT),
     Rule("load", "access", anywhere, effects.not_applicable),
 
     # Extraction: of the descriptor in "initialize", of everything in "extract"

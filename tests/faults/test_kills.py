@@ -91,6 +91,9 @@ class KilledRun:
         assert self._stopped() == stopped, "a rerun starts what it has stopped, and nothing else"
         for facts, found in zip(self.bench.scenario.patches, states):
             self._check_healed(facts, found, left)
+        for code, name in stopped:
+            self.home.start(code[1:], name)
+        assert not self._stopped()
 
     def _check_healed(self, facts, found, left):
         tree = self.home.tree()
