@@ -6,6 +6,7 @@
 #include <climits>
 #include <cstdlib>
 #include <cstring>
+#include <deque>
 #include <memory>
 
 #include <fcntl.h>
@@ -192,9 +193,9 @@ int Util::readFileByLines(const char *name, std::vector<std::string> &lines) {
 void Util::setEnvironment(const std::string &name, const std::string &value) {
   // The environment keeps pointing at the strings, to the very end of the process, so they are never
   // released; kept here, those that a later one has replaced stay reachable for whoever looks for leaks.
-  static auto *const strings = new std::vector<char *>;
-  strings->push_back(strdup((name + "=" + value).c_str()));
-  static_cast<void>(putenv(strings->back()));
+  static auto *const strings = new std::deque<std::string>;
+  strings->push_back(name + "=" + value);
+  static_cast<void>(putenv(strings->back().data()));
 }
 
 bool Util::isVEMSInstalled() {
