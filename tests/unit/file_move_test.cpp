@@ -247,6 +247,14 @@ TEST_F(FileMoveTest, MoveIntoAMissingDirectoryFails) {
   EXPECT_EQ(logLines(), moved({notLinked(source(), home() + "gone/target", "No such file or directory")}));
 }
 
+TEST_F(FileMoveTest, MoveBelowAFileFails) {
+  File file(writeSource());
+  const std::string below = writeTarget() + "/below";
+  EXPECT_FALSE(file.moveFile(below, true));
+  EXPECT_EQ(read(source()), "new");
+  EXPECT_EQ(logLines(), moved({notLinked(source(), below, "Not a directory")}));
+}
+
 TEST_F(FileMoveTest, MoveOntoADirectoryFailsAndLeavesBoth) {
   File file(writeSource());
   makeDirectory("target");

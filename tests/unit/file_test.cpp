@@ -270,6 +270,7 @@ INSTANTIATE_TEST_SUITE_P(
                       NamedPath{"DirectoryGivenWithItsSlash", "dir/sub/", "dir/", "sub"},
                       NamedPath{"DirectoryBehindTwoSlashes", "dir//sub", "dir//", "sub"},
                       NamedPath{"DirectoryInTheRootDirectory", "/tmp", "/", "tmp"},
+                      NamedPath{"TwoSlashesAlone", "//", "/", ""},
                       NamedPath{"NoDirectoryButASlashAtItsEnd", "gone/below/", "gone/below/", "gone/below/"},
                       NamedPath{"OneSlashAtTheEndOnly", "gone/", "gone/", "gone/"},
                       NamedPath{"Empty", "", "", ""}),

@@ -1,6 +1,7 @@
 // Child processes when the system refuses what they need.
 #include "process.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <string>
 #include <vector>
@@ -182,6 +183,14 @@ TEST_F(ProcessFailureTest, EndOfTheChildIsWaitedForBeforeAnythingIsRead) {
   captureShell(WritesToBoth);
   EXPECT_EQ(callsAmong({"wait", "read"}), // KEEP(wait-before-read)
             (std::vector<std::string>{"wait", "read", "read"}));
+}
+
+TEST_F(ProcessFailureTest, WriteEndsAreClosedBeforeTheEndOfTheChildIsWaitedFor) {
+  captureShell(WritesToBoth);
+  std::vector<std::string> calls = callsAmong({"open", "close", "wait"});
+  calls.erase(std::find(calls.begin(), calls.end(), "wait"), calls.end());
+  const auto opened = std::count(calls.begin(), calls.end(), "open"); // and closed again: lines of the log
+  EXPECT_EQ(std::count(calls.begin(), calls.end(), "close"), opened + 2);
 }
 
 TEST_F(ProcessFailureTest, OutputThatCannotBeReadIsLeftOut) {
