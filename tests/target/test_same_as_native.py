@@ -33,13 +33,20 @@ class Outcome(NamedTuple):
     tree: dict
 
 
+def program(variable, preset, runner):
+    found = Program(os.environ.get(variable, BUILDS / preset / "orvpatch"), runner)
+    if not found.binary.exists():
+        pytest.fail(f"{found.binary} is missing: cmake --preset {preset} && cmake --build --preset {preset}")
+    return found
+
+
 def native():
-    return Program(os.environ.get("ORVPATCH_NATIVE", BUILDS / "release/orvpatch"), [])
+    return program("ORVPATCH_NATIVE", "release", [])
 
 
 def target():
     emulator = os.environ.get("ORVPATCH_RUNNER", "qemu-ppc64le -L /usr/powerpc64le-linux-gnu")
-    return Program(os.environ.get("ORVPATCH_TARGET", BUILDS / "ppc64le/orvpatch"), shlex.split(emulator))
+    return program("ORVPATCH_TARGET", "ppc64le", shlex.split(emulator))
 
 
 class Mask:
