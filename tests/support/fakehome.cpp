@@ -46,6 +46,16 @@ Record recordOf(const PatchError &err) {
   return {err.code, err.text};
 }
 
+Printed printedBy(const std::function<bool()> &operation) {
+  Printed printed;
+  ::testing::internal::CaptureStdout();
+  ::testing::internal::CaptureStderr();
+  printed.result = operation();
+  printed.err = ::testing::internal::GetCapturedStderr();
+  printed.out = ::testing::internal::GetCapturedStdout();
+  return printed;
+}
+
 std::string runInfoText(const std::vector<RunRow> &rows) {
   std::string text = "FIELDSEP=|\n";
   for (const RunRow &row : rows)
@@ -138,10 +148,14 @@ LogLines FakeHome::expectFailure(const std::string &component, const Record &exp
                                  const std::function<bool(PatchError *)> &operation) {
   logLines();
   PatchError err{99, "of an earlier failure"};
-  EXPECT_FALSE(operation(&err));
+  printedByFailure_ = printedBy([&] { return operation(&err); });
+  EXPECT_FALSE(printedByFailure_.result);
   EXPECT_EQ(recordOf(err), expected);
   const LogLines lines = logLinesOf(component);
-  EXPECT_FALSE(operation(nullptr));
+  const Printed again = printedBy([&] { return operation(nullptr); });
+  EXPECT_FALSE(again.result);
+  EXPECT_EQ(again.out, printedByFailure_.out);
+  EXPECT_EQ(again.err, printedByFailure_.err);
   EXPECT_EQ(logLinesOf(component), lines) << "without a record the log must read the same";
   return lines;
 }

@@ -26,6 +26,15 @@ using Record = std::pair<int, std::string>;
 Record recordOf(const PatchError &err);
 const Record NoError = {0, ""};
 
+/// What an operation answered and printed. A test looks at it afterwards: an expectation that fails while
+/// the output is captured would not be seen.
+struct Printed {
+  bool result = false;
+  std::string out;
+  std::string err;
+};
+Printed printedBy(const std::function<bool()> &operation);
+
 /// The text of a run-information file; the fields are separated by "|" and the rows are of this host.
 std::string runInfoText(const std::vector<RunRow> &rows);
 
@@ -62,12 +71,17 @@ public:
   std::vector<std::string> journal() const;
 
   /// Runs an operation that must fail, over whatever the record held, and once more without a record, which
-  /// must fail with the same lines of this component in the log. Returns these lines.
+  /// must fail with the same output and the same lines of this component in the log. Returns these lines.
   LogLines expectFailure(const std::string &component, const Record &expected,
                          const std::function<bool(PatchError *)> &operation);
+  /// What the last operation that was expected to fail has printed.
+  const Printed &printedByFailure() const { return printedByFailure_; }
 
 protected:
   void SetUp() override;
+
+private:
+  Printed printedByFailure_;
 };
 
 /// Names in a directory in the order in which the system lists them.

@@ -14,8 +14,6 @@ namespace {
 
 namespace fs = std::filesystem;
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStdout;
 
 const std::string Separator = "\n" + std::string(70, '=') + "\n";
 const std::string RunEntry = "DCFPackageProcessor::run() entry";
@@ -157,9 +155,9 @@ TEST_F(PackageTest, CleanUpThatFailsStopsNothingAndLeavesItsRecord) {
 TEST_F(PackageTest, EmptyListIsReportedAsNotApplicable) {
   const Package package = empty();
   PatchError err;
-  CaptureStdout();
-  EXPECT_TRUE(package->testRun(&err));
-  EXPECT_EQ(GetCapturedStdout(), "\nThere are no patch files applicable to this system.\n\n");
+  const Printed printed = printedBy([&] { return package->testRun(&err); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, "\nThere are no patch files applicable to this system.\n\n");
   EXPECT_EQ(recordOf(err), NoError);
   EXPECT_EQ(logLines(),
             joined({dcfs({ReportEntry}),
@@ -171,9 +169,9 @@ TEST_F(PackageTest, OnePatchIsReportedToTheByte) {
   add("xe");
   const Package package = load(home() + "patches/kxe_lpp266_vema_1.tar");
   PatchError err;
-  CaptureStdout();
-  EXPECT_TRUE(package->testRun(&err));
-  EXPECT_EQ(GetCapturedStdout(), report("xe"));
+  const Printed printed = printedBy([&] { return package->testRun(&err); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, report("xe"));
   EXPECT_EQ(recordOf(err), NoError);
   EXPECT_EQ(packageLines(), dcfs({ReportEntry, ReportExit}));
 }
@@ -183,9 +181,9 @@ TEST_F(PackageTest, TwoPatchesAreReportedToTheByteAndChangeNothing) {
   add("yn");
   const Names before = treeOf(home() + "registry");
   const Package package = loadAll();
-  CaptureStdout();
-  EXPECT_TRUE(package->testRun(nullptr));
-  EXPECT_EQ(GetCapturedStdout(), report(order()[0]) + report(order()[1]));
+  const Printed printed = printedBy([&] { return package->testRun(nullptr); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, report(order()[0]) + report(order()[1]));
   EXPECT_EQ(treeOf(home() + "tmp"), Names{}) << "cleaned up after each";
   EXPECT_EQ(journal(), Names{});
   EXPECT_FALSE(isThere(home() + "xe1"));
@@ -202,15 +200,14 @@ TEST_F(PackageTest, FailedReportEndsTheReportsAndIsNotCleanedUp) {
   makePatch("k" + first + "_lpp266_vema_1.tar", patchIni("k" + first)); // without files
   const Package package = loadAll();
   PatchError err;
-  CaptureStdout();
-  EXPECT_FALSE(package->testRun(&err));
-  const std::string printed = GetCapturedStdout();
-  EXPECT_EQ(printed, Separator + "Processing patch file: " + home() + "patches/k" + first +
-                         "_lpp266_vema_1.tar\n    Fix pack of k" + first +
-                         "\n\n"
-                         "No commands to be executed before the agent instances are stopped.\n\n"
-                         "No instances of running dependent agents to stop or restart.\n\n"
-                         "No commands to be executed after stopping the agent instances.\n\n");
+  const Printed printed = printedBy([&] { return package->testRun(&err); });
+  EXPECT_FALSE(printed.result);
+  EXPECT_EQ(printed.out, Separator + "Processing patch file: " + home() + "patches/k" + first +
+                             "_lpp266_vema_1.tar\n    Fix pack of k" + first +
+                             "\n\n"
+                             "No commands to be executed before the agent instances are stopped.\n\n"
+                             "No instances of running dependent agents to stop or restart.\n\n"
+                             "No commands to be executed after stopping the agent instances.\n\n");
   EXPECT_EQ(recordOf(err), NoError) << "a patch without files leaves no code";
   EXPECT_EQ(packageLines(), dcfs({ReportEntry, "Unable to apply patch: Fix pack of k" + first, ReportExit}));
   EXPECT_TRUE(isThere(home() + "tmp/k" + first + "/patch.ini"));
@@ -221,9 +218,8 @@ TEST_F(PackageTest, FailedExtractionInAReportIsInTheRecord) {
   const Package package = loadAll();
   fs::remove(home() + "patches/kxe_lpp266_vema_1.tar");
   PatchError err;
-  CaptureStdout();
-  EXPECT_FALSE(package->testRun(&err));
-  GetCapturedStdout();
+  const Printed printed = printedBy([&] { return package->testRun(&err); });
+  EXPECT_FALSE(printed.result);
   EXPECT_EQ(recordOf(err), Record(3, "Bad return code from tar -xf: 2"));
   EXPECT_EQ(packageLines(), dcfs({ReportEntry, "Unable to apply patch: Fix pack of kxe", ReportExit}));
 }
@@ -234,9 +230,9 @@ TEST_F(PackageTest, PercentSignsOfADescriptionAreJustText) {
   ini.replace(ini.find("Fix pack of kxe"), 15, "100%s%n");
   makePatch("kxe_lpp266_vema_1.tar", ini, {{"updated_files/file", ""}});
   const Package package = loadAll();
-  CaptureStdout();
-  EXPECT_TRUE(package->testRun(nullptr));
-  EXPECT_NE(GetCapturedStdout().find("\n    100%s%n\n\n"), std::string::npos);
+  const Printed printed = printedBy([&] { return package->testRun(nullptr); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_NE(printed.out.find("\n    100%s%n\n\n"), std::string::npos);
 }
 
 } // namespace

@@ -185,9 +185,7 @@ TEST_F(LoadTest, FileForARunningServerEndsTheLoading) {
   install("qalpp266.ver", "06200000");
   setRunning({{"qa", "11"}});
   const std::string path = makePatch("kqa_lpp266_vems_1.tar", patchIni("kqa"));
-  ::testing::internal::CaptureStderr();
   const LogLines lines = expectLoadFails(path, {35, ""});
-  ::testing::internal::GetCapturedStderr();
   EXPECT_EQ(
       lines,
       aroundLoading(path,

@@ -15,8 +15,6 @@
 namespace {
 
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStdout;
 
 const std::string AgentPatch = "kxe_lpp266_vema_fp0001.tar";
 const std::string NoneRuns = "No instances of running dependent agents to stop or restart.\n\n";
@@ -63,9 +61,9 @@ public:
     return ownLines();
   }
   static std::string printed(const Processor &processor) {
-    CaptureStdout();
-    EXPECT_TRUE(processor->printDependentsList(nullptr));
-    return GetCapturedStdout();
+    const Printed list = printedBy([&] { return processor->printDependentsList(nullptr); });
+    EXPECT_TRUE(list.result);
+    return list.out;
   }
   /// What the control scripts were called for since the last question.
   Names calls() {

@@ -16,8 +16,6 @@ namespace {
 
 namespace fs = std::filesystem;
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStdout;
 
 const std::string MoveEntry = "PatchProcessor::moveFiles() entry";
 const std::string MoveDone = "PatchProcessor::moveFile() = 1"; // of moveFiles
@@ -265,9 +263,9 @@ TEST_F(FileListTest, FilesArePrintedWithTheirTargetsAndNothingMoves) {
   const Names before = treeOf(home());
   const std::string directory = Util::getCurrentDirectory();
   PatchError err;
-  CaptureStdout();
-  EXPECT_TRUE(kxe->listFiles(&err));
-  EXPECT_EQ(GetCapturedStdout(), listing({"new/deep/a", "new/b", "top"}));
+  const Printed printed = printedBy([&] { return kxe->listFiles(&err); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, listing({"new/deep/a", "new/b", "top"}));
   EXPECT_EQ(recordOf(err), NoError);
   EXPECT_EQ(ownLines(), (LogLines{entry_, ppInfo(ListHeading), mapped("new/deep/a"), mapped("new/b"),
                                   mapped("top"), exit_}));
@@ -279,9 +277,9 @@ TEST_F(FileListTest, FilesArePrintedWithTheirTargetsAndNothingMoves) {
 TEST_F(FileListTest, PatchWithoutFilesFailsWithAnEmptyLineOnly) {
   const Processor kxe = processor();
   PatchError err;
-  CaptureStdout();
-  EXPECT_FALSE(kxe->listFiles(&err));
-  EXPECT_EQ(GetCapturedStdout(), "\n");
+  const Printed printed = printedBy([&] { return kxe->listFiles(&err); });
+  EXPECT_FALSE(printed.result);
+  EXPECT_EQ(printed.out, "\n");
   EXPECT_EQ(recordOf(err), NoError);
   EXPECT_EQ(ownLines(), (LogLines{entry_, ppInfo("This patch contains no files to update."), exit_}));
 }
@@ -289,9 +287,9 @@ TEST_F(FileListTest, PatchWithoutFilesFailsWithAnEmptyLineOnly) {
 TEST_F(FileListTest, EmptyTreeListsNothingAndSucceeds) {
   makeDirectory("tmp/kxe/updated_files/empty");
   const Processor kxe = processor();
-  CaptureStdout();
-  EXPECT_TRUE(kxe->listFiles(nullptr));
-  EXPECT_EQ(GetCapturedStdout(), listing({}));
+  const Printed printed = printedBy([&] { return kxe->listFiles(nullptr); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, listing({}));
   EXPECT_EQ(ownLines(), (LogLines{entry_, ppInfo(ListHeading), exit_}));
 }
 
@@ -299,10 +297,9 @@ TEST_F(FileListTest, TreeThatCannotBeEnteredIsCode24) {
   write("tmp/kxe/updated_files", "a file");
   const Processor kxe = processor();
   const std::string message = "Could not change current working directory to: " + sourceRoot();
-  CaptureStdout();
   const LogLines lines =
       expectOwnFailure({24, message}, [&](PatchError *err) { return kxe->listFiles(err); });
-  EXPECT_EQ(GetCapturedStdout(), "\n\n") << "one empty line for each call";
+  EXPECT_EQ(printedByFailure().out, "\n");
   EXPECT_EQ(lines, (LogLines{entry_, ppError(message), exit_}));
 }
 
@@ -311,9 +308,9 @@ TEST_F(FileListTest, OneFileMayBeListedByItself) {
   const Processor kxe = processor();
   fs::current_path(sourceRoot());
   File entry("./bin/agent");
-  CaptureStdout();
-  EXPECT_TRUE(kxe->listFile(&entry, nullptr));
-  EXPECT_EQ(GetCapturedStdout(), "    " + home() + "bin/agent\n");
+  const Printed printed = printedBy([&] { return kxe->listFile(&entry, nullptr); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, "    " + home() + "bin/agent\n");
   EXPECT_EQ(ownLines(), LogLines{mapped("bin/agent")});
 }
 
@@ -348,9 +345,9 @@ TEST_F(NoWayBackTest, ListingIsCode24AfterTheFilesWereListed) {
   const BoundByPermissions bound(home());
   const std::string message = "Could not change current working directory to: " + leave();
   PatchError err;
-  CaptureStdout();
-  EXPECT_FALSE(kxe->listFiles(&err));
-  EXPECT_EQ(GetCapturedStdout(), listing({"top"}));
+  const Printed printed = printedBy([&] { return kxe->listFiles(&err); });
+  EXPECT_FALSE(printed.result);
+  EXPECT_EQ(printed.out, listing({"top"}));
   EXPECT_EQ(recordOf(err), Record(24, message));
   EXPECT_EQ(ownLines(), (LogLines{entry_, ppInfo(ListHeading), mapped("top"), ppError(message), exit_}));
 }

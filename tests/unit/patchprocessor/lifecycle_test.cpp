@@ -18,10 +18,6 @@ namespace {
 namespace fs = std::filesystem;
 using Names = std::vector<std::string>;
 using ::testing::StartsWith;
-using ::testing::internal::CaptureStderr;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStderr;
-using ::testing::internal::GetCapturedStdout;
 
 const std::string PatchName = "kxe_lpp266_vema_fp0001.tar";
 
@@ -301,13 +297,14 @@ TEST_F(LifecycleTest, OsAgentIsKox) {
 }
 
 TEST_F(LifecycleTest, SelfCheckPrintsItsBannerAndReportsThatTheSamplePatchIsMissing) {
-  CaptureStdout();
-  CaptureStderr();
-  patchProcessorSelfCheck();
-  EXPECT_EQ(GetCapturedStdout(), "----------------------------------------\n"
-                                 "- Testing patchProcesser API's\n"
-                                 "----------------------------------------\n");
-  EXPECT_THAT(GetCapturedStderr(), StartsWith("Can't initialize patch processor, Error: "));
+  const Printed printed = printedBy([] {
+    patchProcessorSelfCheck();
+    return true;
+  });
+  EXPECT_EQ(printed.out, "----------------------------------------\n"
+                         "- Testing patchProcesser API's\n"
+                         "----------------------------------------\n");
+  EXPECT_THAT(printed.err, StartsWith("Can't initialize patch processor, Error: "));
 }
 
 } // namespace

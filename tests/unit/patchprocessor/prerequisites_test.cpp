@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "patchhome.h"
@@ -12,10 +13,7 @@
 namespace {
 
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStderr;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStderr;
-using ::testing::internal::GetCapturedStdout;
+using ::testing::StartsWith;
 
 const std::string AgentPatch = "kxe_lpp266_vema_fp0001.tar";
 const std::string Entry = "PatchProcessor::checkPrereqs() entry";
@@ -289,9 +287,9 @@ public:
     PatchError err;
     const Processor processor = processorFor(patch);
     logLines();
-    CaptureStderr();
-    EXPECT_TRUE(processor->checkForActivePrograms(&err));
-    EXPECT_EQ(GetCapturedStderr(), "");
+    const Printed printed = printedBy([&] { return processor->checkForActivePrograms(&err); });
+    EXPECT_TRUE(printed.result);
+    EXPECT_EQ(printed.out + printed.err, "");
     EXPECT_EQ(recordOf(err), NoError);
     EXPECT_EQ(ownLines(), joined({pps({ActiveEntry}), activeEnd(true)}));
   }
@@ -301,12 +299,10 @@ public:
     const Processor processor = processorFor(patch);
     const std::string path = patchPath(patch);
     const std::string message = "The " + path + " file\n" + explanation;
-    CaptureStderr();
-    CaptureStdout();
     const LogLines lines =
         expectOwnFailure({code, ""}, [&](PatchError *err) { return processor->checkForActivePrograms(err); });
-    EXPECT_EQ(GetCapturedStderr(), "\n\n" + message + "\n\n\n" + message + "\n") << "once for each call";
-    EXPECT_EQ(GetCapturedStdout(), "");
+    EXPECT_EQ(printedByFailure().err, "\n\n" + message + "\n");
+    EXPECT_EQ(printedByFailure().out, "");
     EXPECT_EQ(lines, joined({pps({ActiveEntry, "Found a running instance of the " + what +
                                                    ". Aborting installation of " + path + "."}),
                              {ppError(message)},
@@ -348,9 +344,9 @@ TEST_F(ActiveTest, PathIsNamedAsItWasGiven) {
   setRunning({{"qa", "11"}});
   std::filesystem::current_path(makeDirectory("patches"));
   const Processor relative(PatchProcessor::createProcessor("./kqa_lpp266_vems_1.tar", home(), nullptr));
-  CaptureStderr();
-  EXPECT_FALSE(relative->checkForActivePrograms(nullptr));
-  EXPECT_EQ(GetCapturedStderr().substr(0, 37), "\n\nThe ./kqa_lpp266_vems_1.tar file\nin");
+  const Printed printed = printedBy([&] { return relative->checkForActivePrograms(nullptr); });
+  EXPECT_FALSE(printed.result);
+  EXPECT_THAT(printed.err, StartsWith("\n\nThe ./kqa_lpp266_vems_1.tar file\nincludes updates"));
 }
 
 TEST_F(ActiveTest, ServerThatIsInstalledButStoppedPasses) {

@@ -13,8 +13,6 @@
 namespace {
 
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStdout;
 
 const std::string Entry = "PatchProcessor::findProductEXEFiles() entry";
 const std::string Exit = "PatchProcessor::findProductEXEFiles() exit";
@@ -64,9 +62,9 @@ TEST_F(ProductExeTest, ListingOnlyTraces) {
   fill({"agent_copy.bin"});
   const Processor kxe = naming("agent.bin");
   PatchError err;
-  CaptureStdout();
-  EXPECT_TRUE(kxe->listProductEXEFiles(&err));
-  EXPECT_EQ(GetCapturedStdout(), "");
+  const Printed printed = printedBy([&] { return kxe->listProductEXEFiles(&err); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, "");
   EXPECT_EQ(recordOf(err), NoError);
   EXPECT_EQ(logLines(), pps({"PatchProcessor::listProductEXEFiles() entry",
                              "PatchProcessor::listProductEXEFiles() = 1"}));

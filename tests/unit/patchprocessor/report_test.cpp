@@ -13,8 +13,6 @@
 namespace {
 
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStdout;
 
 const std::string PatchName = "kxe_lpp266_vema_fp0001.tar";
 const std::string NoPrePatch = "No commands to be executed before the agent instances are stopped.\n";
@@ -35,9 +33,10 @@ public:
     return kxe;
   }
   static std::string report(const Processor &processor, bool expected, PatchError *err = nullptr) {
-    CaptureStdout();
-    EXPECT_EQ(processor->testRun(err), expected);
-    return GetCapturedStdout();
+    const Printed printed = printedBy([&] { return processor->testRun(err); });
+    EXPECT_EQ(printed.result, expected);
+    EXPECT_EQ(printed.err, "");
+    return printed.out;
   }
 };
 

@@ -15,10 +15,6 @@ namespace {
 
 namespace fs = std::filesystem;
 using Names = std::vector<std::string>;
-using ::testing::internal::CaptureStderr;
-using ::testing::internal::CaptureStdout;
-using ::testing::internal::GetCapturedStderr;
-using ::testing::internal::GetCapturedStdout;
 
 /// Passes when PATH and the working directory are what they were when it was made.
 class NothingStays {
@@ -105,14 +101,12 @@ TEST_F(ScriptsTest, FailedCommandStopsTheListAndItsOutputGoesToTheLogOnly) {
   bring(command("2.sh", "two"));
   const std::string path = getenv("PATH");
   const std::string message = "Bad return code from 1.sh: 3";
-  CaptureStdout();
-  CaptureStderr();
   EXPECT_EQ(expectScriptsFail({"1.sh", "2.sh"}, {-1, message}),
             around(tempDir(), path,
                    {ppInfo("Processing 2 scripts."), ppInfo("Attempting to execute: 1.sh"), ppError(message),
                     ppError("stdOut: told 100%s\n"), ppError("stdErr: why %n\n")},
                    false));
-  EXPECT_EQ(GetCapturedStdout() + GetCapturedStderr(), "");
+  EXPECT_EQ(printedByFailure().out + printedByFailure().err, "");
   EXPECT_EQ(journal(), (Names{"one", "one"})) << "once for each of the two calls";
 }
 
