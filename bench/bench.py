@@ -24,6 +24,8 @@ from payloads import PAYLOADS  # noqa: E402
 from rounds import Bench  # noqa: E402
 from tables import goals_table, growth_table, system_call_table, trial_table  # noqa: E402
 
+DOCUMENT = ROOT / "docs/performance.md"
+MARK = "<!-- below: what scripts/bench --write has put here -->\n"
 GROWTH = ("s1", "s10", "c")
 PROGRAMS = ("cc", "tar", "dpkg", "rpm", "rsync")
 
@@ -35,6 +37,7 @@ def arguments():
     parser.add_argument("--rounds", type=int, default=7, help="default: %(default)s")
     parser.add_argument("--tiny", action="store_true", help="payloads of a few files: shows only that all of it runs")
     parser.add_argument("--orvpatch", type=Path, default=ROOT / "build/release/orvpatch", help="default: %(default)s")
+    parser.add_argument("--write", action="store_true", help="put the tables into docs/performance.md too")
     chosen = parser.parse_args()
     unknown = set(chosen.payloads.split(",")) - set(keys)
     if unknown or chosen.rounds < 1:
@@ -68,14 +71,18 @@ def version_of(program):
     return shown.splitlines()[0]
 
 
-def print_tables(trials, file_system, loads):
-    print(machine(file_system, loads))
-    print(f"## Goals\n\n{goals_table(trials)}")
-    print("## Payloads\n")
-    for trial in trials.values():
-        print(trial_table(trial))
-    print(f"## System calls\n\n{system_call_table(list(trials.values()))}")
-    print(f"## Growth\n\n{growth_table([trials[key] for key in GROWTH if key in trials])}", end="")
+def all_tables(trials, file_system, loads):
+    growth = [trials[key] for key in GROWTH if key in trials]
+    return "\n".join([machine(file_system, loads),
+                      f"### Goals\n\n{goals_table(trials)}",
+                      *map(trial_table, trials.values()),
+                      f"### System calls\n\n{system_call_table(list(trials.values()))}",
+                      *([f"### Growth\n\n{growth_table(growth)}"] if growth else [])])
+
+
+def write_into_document(tables):
+    head = DOCUMENT.read_text(encoding="utf-8").partition(MARK)[0]
+    DOCUMENT.write_text(f"{head}{MARK}\n{tables}", encoding="utf-8")
 
 
 def progress(text):
@@ -90,7 +97,10 @@ def main():
         tempfile.tempdir = str(folder)
         bench = Bench(chosen.orvpatch.absolute(), folder, Meter(folder))
         trials = {payload.key: bench.trial(payload, chosen.rounds, progress) for payload in chosen_payloads(chosen)}
-    print_tables(trials, file_system, bench.loads)
+    tables = all_tables(trials, file_system, bench.loads)
+    print(tables, end="")
+    if chosen.write:
+        write_into_document(tables)
 
 
 if __name__ == "__main__":
