@@ -97,7 +97,9 @@ void FakeHome::SetUp() {
   write("bin/QuillAgent", ControlScript, Executable);
   write("bin/QuillServer", ControlScript, Executable);
   write("ps/ps", PsScript, Executable);
-  setenv("PATH", (home() + "ps:" + getenv("PATH")).c_str(), 1);
+  // Not the caller's PATH: a folder on it that the user may not enter changes the error number of a program
+  // that is nowhere.
+  setenv("PATH", (home() + "ps:/usr/bin:/bin").c_str(), 1);
 }
 
 std::string FakeHome::install(const std::string &file, const std::string &level,
