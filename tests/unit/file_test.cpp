@@ -181,11 +181,14 @@ TEST_F(FileTest, InitializeTakesTheSnapshotAnew) {
   expectNothingThere(file);
 }
 
-TEST_F(FileTest, InitializeForgetsTheListings) {
+TEST_F(FileTest, InitializeForgetsBothListings) {
   File directory(makeDirectory("dir"));
   EXPECT_TRUE(directory.listFiles()->empty());
+  EXPECT_TRUE(directory.listSubDirectories()->empty());
   write("dir/new", "");
+  makeDirectory("dir/new-sub");
   directory.initialize();
+  EXPECT_EQ(directory.listSubDirectories()->size(), 1U);
   EXPECT_EQ(directory.listFiles()->size(), 1U);
 }
 
