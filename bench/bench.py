@@ -52,13 +52,14 @@ def chosen_payloads(chosen):
     return [payload.tiny() for payload in payloads] if chosen.tiny else payloads
 
 
-def machine(file_system, loads):
+def conditions(file_system, bench, rounds):
     """What the figures depend on, as the first table."""
     model = next((line.split(":")[1].strip() for line in Path("/proc/cpuinfo").read_text().splitlines()
                   if line.startswith(("model name", "cpu\t"))), platform.machine())
     rows = [("date", f"{datetime.date.today()}"), ("processor", f"{os.cpu_count()} x {model}"),
             ("kernel", f"{platform.system()} {platform.release()}"), ("file system", file_system),
-            ("load before each run", f"{min(loads):.2f} to {max(loads):.2f}"),
+            ("rounds", rounds),
+            ("load before each run", f"{min(bench.loads):.2f} to {max(bench.loads):.2f}"),
             *((program, version_of(program)) for program in PROGRAMS)]
     return "".join(f"| {name} | {value} |\n" for name, value in [("", ""), ("---", "---"), *rows])
 
@@ -71,9 +72,9 @@ def version_of(program):
     return shown.splitlines()[0]
 
 
-def all_tables(trials, file_system, loads):
+def all_tables(first_table, trials):
     growth = [trials[key] for key in GROWTH if key in trials]
-    return "\n".join([machine(file_system, loads),
+    return "\n".join([first_table,
                       f"### Goals\n\n{goals_table(trials)}",
                       *map(trial_table, trials.values()),
                       f"### System calls\n\n{system_call_table(list(trials.values()))}",
@@ -97,7 +98,7 @@ def main():
         tempfile.tempdir = str(folder)
         bench = Bench(chosen.orvpatch.absolute(), folder, Meter(folder))
         trials = {payload.key: bench.trial(payload, chosen.rounds, progress) for payload in chosen_payloads(chosen)}
-    tables = all_tables(trials, file_system, bench.loads)
+    tables = all_tables(conditions(file_system, bench, chosen.rounds), trials)
     print(tables, end="")
     if chosen.write:
         write_into_document(tables)
