@@ -315,10 +315,10 @@ def assert_log_is_whole(home, runs):
 
 @pytest.mark.parametrize("attempt", range(3))
 def test_two_runs_at_once_of_the_same_patch(program, agent_home, patch_dir, attempt):
-    """They share the temporary directory, so either may fail; the file is there or waits, and a rerun heals."""
+    """They share the temporary directory, so either may fail; once both have ended, a rerun heals."""
     patch = agent_patch(patch_dir)
     done = run_together(*[lambda: program.install(agent_home, patch)] * 2)
-    assert all(result.status in (0, 3, 5, 6, 7, 21, 24, 25, 26) for result in done), done
+    assert all(result.status in (0, 3, 5, 6, 7, 9, 21, 24, 25, 26, 28) for result in done), done
     records = results(agent_home)
     assert records.count("PASS") == [result.status for result in done].count(0)
     assert_heals(program, agent_home, patch, records)
