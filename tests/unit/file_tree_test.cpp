@@ -1,4 +1,5 @@
 // Making directories with their parents, listing them and removing whole trees.
+#include <cerrno>
 #include <filesystem>
 #include <set>
 #include <string>
@@ -265,6 +266,25 @@ TEST_F(ListingTest, DirectoryThatCannotBeOpenedHasEmptyListsAndNoMessage) {
   makeDirectory("dir");
   File listed = directory();
   fs::remove(home() + "dir");
+  EXPECT_TRUE(listed.listFiles()->empty());
+  EXPECT_EQ(logLines(), LogLines{LoadEntry});
+}
+
+TEST_F(ListingTest, EarlierErrorNumberIsNotTakenForOneOfTheDirectory) {
+  write("dir/file", "");
+  File listed = directory();
+  errno = EIO;
+  listed.loadDir();
+  EXPECT_EQ(logLines(), (LogLines{LoadEntry, LoadExit}));
+}
+
+TEST_F(ListingTest, RemovedDirectoryIsNotListedWhenAnotherTakesItsPlace) {
+  makeDirectory("dir");
+  File listed = directory();
+  EXPECT_TRUE(listed.rmdir());
+  write("dir/file", "");
+  logLines();
+  listed.loadDir();
   EXPECT_TRUE(listed.listFiles()->empty());
   EXPECT_EQ(logLines(), LogLines{LoadEntry});
 }
