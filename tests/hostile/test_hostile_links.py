@@ -95,6 +95,17 @@ def test_what_a_link_left_behind_does_not_stop_the_next_patch(program, product, 
     assert product.read("bin/tool") == b"new\n"
 
 
+def test_a_link_left_behind_takes_part_in_the_next_patch(program, product, patch_dir, foreign):
+    # It could not be removed, so it is still there when the next archive is extracted over it.
+    first = RawArchive(PATCH).link("updated_files/lib", str(foreign)).write(patch_dir)
+    assert program.install(product, first) == INSTALLED
+    (foreign / "later").write_text("later\n")
+    second = Patch("ox", fixpack="fp0002").file("bin/tool").write(patch_dir)
+    assert program.install(product, second) == INSTALLED
+    assert product.read("lib/later") == b"later\n"
+    assert os.listdir(foreign) == []
+
+
 def test_a_target_that_is_a_dangling_link_is_not_written_through(program, product, patch_dir, scratch):
     # Its name is taken, so the new file cannot be linked to it; nothing comes to where it leads.
     os.symlink(scratch / "outside", product.path / "bin/tool")
