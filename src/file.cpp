@@ -131,7 +131,8 @@ void File::initialize() {
   // then empty, does not exist for this class.
   const bool slash = endsInSlash(path_);
   struct stat status = {};
-  if (stat((slash ? path_.substr(0, path_.size() - 1) : path_).c_str(), &status) != 0) {
+  // Two pointers: of two strings the conditional would make a copy, for every file.
+  if (stat(slash ? path_.substr(0, path_.size() - 1).c_str() : path_.c_str(), &status) != 0) {
     const int error = errno;
     if (error != ENOENT && error != ENOTDIR)
       LOG_ERROR("Unable to determine file/directory for path: %s. %s", path_.c_str(), strerror(error));

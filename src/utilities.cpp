@@ -121,8 +121,11 @@ std::vector<std::string> Util::tokenizeString(const std::string &s, const char *
 }
 
 std::string Util::removeDotFromPath(const std::string &path) {
-  const std::size_t dot = path.find("/./");
-  return dot == std::string::npos ? path : path.substr(0, dot) + path.substr(dot + 2);
+  std::string result = path;
+  const std::size_t dot = result.find("/./");
+  if (dot != std::string::npos)
+    result.erase(dot, 2);
+  return result;
 }
 
 std::string Util::toLower(const std::string &s) {
