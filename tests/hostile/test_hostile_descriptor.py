@@ -78,7 +78,7 @@ def test_a_million_lines(validate, content):
     assert validate(content) == VALID
 
 
-def test_a_million_commands_are_reported_in_order(program, product, patch_dir):
+def test_a_million_commands_are_reported_in_order(program, product, patch_dir):  # KEEP(sorted-names)
     commands = sorted(str(number) for number in range(1000000))
     report = program.report(product, Patch("ox", pre=reversed(commands)).directory().write(patch_dir))
     assert (report.status, report.err) == (0, b"")

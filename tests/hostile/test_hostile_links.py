@@ -78,6 +78,7 @@ def test_the_tree_of_files_itself_may_be_a_link(program, product, patch_dir, for
 
 
 def test_a_dangling_link_counts_as_moved_and_stays_behind(program, product, patch_dir):
+    # KEEP(move-missing-source), KEEP(cleanup-unchecked)
     archive = (RawArchive(PATCH).link("updated_files/bin/gone", "/nonexistent/file")
                .file("updated_files/bin/tool").write(patch_dir))
     assert program.install(product, archive) == INSTALLED

@@ -107,6 +107,7 @@ EVERY_LINE = b"".join(b"a" + bytes([value]) + b"z\n" for value in range(1, 256))
     b"line\n" * 1000000 + b"VRMF = 06100000\n",
 ], ids=["every byte", "CRLF", "NUL", "no end", "many keys", "megabyte", "million lines"])
 def test_the_level_is_rewritten_and_all_other_lines_stay(program, product, patch_dir, content):
+    # KEEP(final-empty-line)
     product.write("registry/oxlpp266.ver", content)
     assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir)) == INSTALLED
     assert product.read("registry/oxlpp266.ver") == rewritten(content, b"06100100")

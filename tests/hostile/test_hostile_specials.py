@@ -152,7 +152,7 @@ def test_a_home_that_is_no_directory_is_none(program, scratch, patch_dir, make):
 
 @pytest.mark.parametrize("place, code, text", [
     ("tmp", 3, "Unable to create directory: {home}tmp/kox"),
-    # What is there counts as made; entering it then fails.
+    # KEEP(mkdir-known-existence): what is there counts as made; entering it then fails.
     ("tmp/kox", 24, "Could not change current working directory to: {home}tmp/kox")])
 @pytest.mark.parametrize("make", [lambda path: path.write_text(""), os.mkfifo], ids=["file", "fifo"])
 def test_where_the_temporary_directory_belongs_it_ends_the_patch(
