@@ -26,6 +26,7 @@ struct State {
   std::list<PlannedFailure> failures; // a list: tests keep references to its elements
   std::vector<Call> journal;
   std::size_t transferLimit = SIZE_MAX;
+  std::size_t readableBytes = SIZE_MAX;
   bool answersUser = false;
   uid_t user = 0;
   std::string nodeName;
@@ -71,6 +72,9 @@ void failAllocationOf(std::size_t size) {
 }
 void limitTransfers(std::size_t bytes) {
   state().transferLimit = bytes;
+}
+void endReadsAfter(std::size_t bytes) {
+  state().readableBytes = bytes;
 }
 void answerNodeName(const std::string &name) {
   state().nodeName = name;
@@ -162,7 +166,13 @@ int __wrap_open(const char *path, int flags, ...) {
 }
 
 ssize_t __wrap_read(int descriptor, void *buffer, size_t size) {
-  return fails("read") ? -1 : __real_read(descriptor, buffer, std::min(size, state().transferLimit));
+  if (fails("read"))
+    return -1;
+  const ssize_t count =
+      __real_read(descriptor, buffer, std::min({size, state().transferLimit, state().readableBytes}));
+  if (count > 0)
+    state().readableBytes -= static_cast<std::size_t>(count);
+  return count;
 }
 
 ssize_t __wrap_write(int descriptor, const void *buffer, size_t size) {

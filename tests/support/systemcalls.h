@@ -48,6 +48,8 @@ PlannedFailure &failCall(const std::string &call, int errorNumber);
 void failAllocationOf(std::size_t size);
 /// Lets reads and writes transfer at most so many bytes each.
 void limitTransfers(std::size_t bytes);
+/// Lets reads find the end of the file after so many bytes in all.
+void endReadsAfter(std::size_t bytes);
 /// What getuid and uname answer.
 void answerUser(uid_t user);
 void answerNodeName(const std::string &name);

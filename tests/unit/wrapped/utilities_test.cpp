@@ -173,6 +173,14 @@ TEST_F(ReadFileFailureTest, PartOfAFileIsNotTakenForTheFile) {
   EXPECT_EQ(buffer, nullptr);
 }
 
+TEST_F(ReadFileFailureTest, FileThatShrinksMeanwhileEndsAfterWhatWasRead) {
+  endReadsAfter(5000);
+  Buffer buffer;
+  EXPECT_EQ(readFile(buffer), 0);
+  ASSERT_NE(buffer, nullptr);
+  EXPECT_EQ(std::string(buffer.get()), std::string(5000, 'c'));
+}
+
 TEST_F(ReadFileFailureTest, InterruptedReadIsTakenUpAgain) {
   failCall("read", EINTR).times(2);
   Buffer buffer;
