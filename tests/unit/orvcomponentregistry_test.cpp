@@ -215,21 +215,21 @@ TEST_F(RegistryTest, FileMayHaveCarriageReturns) {
 
 // KEEP(prereq-first-piece)
 TEST_F(RegistryTest, EveryPrerequisiteLineAddsItsFirstPiece) {
-  const std::string path =
-      write("registry/oxlpp266.ver", "VRMF = 06100000\npreReqALL = kox|kqa\npreReqALL = none\n"
-                                     "preReqALL = qalpp266\npreReqALL = ||\npreReqALL =\npreReqALL = NONE\n");
+  const std::string path = write("registry/oxlpp266.ver",
+                                 "VRMF = 06100000\npreReqALL = kox|kqa\npreReqALL = none\n"
+                                 "preReqALL = qalpp266 | x\npreReqALL = ||\npreReqALL =\npreReqALL = NONE\n");
   EXPECT_EQ(
       linesOf("orvcomponentregistry", linesOfBuilding()),
       own({"ORVComponentRegistry::ORVComponentRegistry entry", "ORVComponentRegistry::buildComponents entry",
            "ORVComponentRegistry::getCInfo_Running entry", "unable to read RunInfo file",
            "ORVComponentRegistry::getCInfo exit", "ORVComponentRegistry::buildComponent(" + path + ") entry",
-           "Added preReqALL value = kox", "Added preReqALL value = none", "Added preReqALL value = qalpp266",
+           "Added preReqALL value = kox", "Added preReqALL value = none", "Added preReqALL value = qalpp266 ",
            "preReqALL syntax unknown: Defaulting preReqALL value = none",
            "preReqALL syntax unknown: Defaulting preReqALL value = none", "Added preReqALL value = NONE",
            "ORVComponentRegistry::buildComponent exit", "ORVComponentRegistry::buildComponents exit",
            "ORVComponentRegistry::ORVComponentRegistry exit"}));
   EXPECT_EQ(ORVComponentRegistry::getInstance()->getInstalledComponents()->front()->getPrereqs(),
-            (Names{"kox", "none", "qalpp266", "none", "none", "NONE"}));
+            (Names{"kox", "none", "qalpp266 ", "none", "none", "NONE"}));
 }
 
 TEST_F(RegistryTest, FileWithoutALevelIsReadButYieldsNoComponent) {

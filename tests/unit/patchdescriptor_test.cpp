@@ -205,6 +205,15 @@ TEST_F(DescriptorTest, MissingOptionalKeysClearARecordOfBefore) {
   EXPECT_TRUE(descriptor.buildInfoSection(&info, nullptr));
 }
 
+TEST_F(DescriptorTest, CodeOfAStrayLineStaysOnlyWhenBothOptionalKeysAreThere) {
+  const std::string stray = "x = 1\n" + Minimal;
+  accepted(stray);
+  accepted(stray + "productBinArch = a\n");
+  PatchError err;
+  EXPECT_NE(parse(stray + "productBinArch = a\nproductEXE = e\n", &err), nullptr);
+  EXPECT_EQ(recordOf(err), Record(4, "Properites start before section definition"));
+}
+
 struct NormalisedCode {
   const char *written;
   const char *stored;
