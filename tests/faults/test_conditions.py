@@ -181,6 +181,17 @@ def test_quota_of_descriptors(program, agent_home, patch_dir, limit):
         assert_heals(program, agent_home, patch, ends[done.status][-1])
 
 
+def test_memory_that_runs_out(program, agent_home, patch_dir):
+    """The loader ends with a status of its own; once the program runs, it ends with a message and no signal."""
+    patch, ends = agent_patch(patch_dir), {}
+    for kilobytes in range(150, 400, 10):
+        done = program.install(agent_home, patch, wrapper=["prlimit", f"--data={kilobytes * 1024}"])
+        ends.setdefault(done.status, done.err)
+    assert ends.keys() - {3, 21} == {127, 71, 0}, ends
+    assert ends[71] == b"orvpatch: out of memory\n"
+    assert_heals(program, agent_home, patch, results(agent_home))
+
+
 # --- links ---------------------------------------------------------------------------------------------------
 
 
