@@ -127,7 +127,7 @@ def static_stages():
     ]
 
 
-PROGRAM_TESTS = ["tests/cases", "tests/hostile"]
+PROGRAM_TESTS = ["tests/cases", "tests/hostile", "tests/fuzz"]
 SANITIZED = {"ASAN_OPTIONS": "abort_on_error=1", "UBSAN_OPTIONS": "print_stacktrace=1:abort_on_error=1"}
 EMULATED = {"ORVPATCH_RUNNER": "/usr/bin/qemu-ppc64le -L /usr/powerpc64le-linux-gnu"}
 

@@ -119,6 +119,12 @@ def test_any_user_can_become_the_owner_of_a_process_in_the_tools_eyes(program, p
     bait = as_nobody(late_name, scratch / "pid")  # begun before the agent, it stands before it in the list
     try:
         product.start("yn")
+        while product.pid("yn") < bait.pid:  # process ids have begun anew in between
+            bait.kill()
+            bait.wait()
+            bait = as_nobody(late_name, scratch / "pid")
+            product.stop("yn")
+            product.start("yn")
         (scratch / "pid").write_text(str(product.pid("yn")))
         await_command_line(bait, "sleep-interval")
         result = program.install(product, Patch("yn").file("bin/tool").write(patch_dir))

@@ -33,7 +33,7 @@ struct State {
 };
 
 State &state() {
-  static State instance;
+  static State &instance = *new State; // calls are made until the very end of the process
   return instance;
 }
 
