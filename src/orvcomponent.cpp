@@ -104,8 +104,8 @@ void ORVComponent::readRunInfoLine(const std::string &line, const std::string &s
     LOG_TRACE("Invalid line format: %s", line.c_str());
     return;
   }
-  // KEEP(host-prefix): the host of the line may be longer, since some agents report it with its domain; that
-  // a host1 accepts the lines of a host12 too is the price.
+  // KEEP(host-prefix): the host of the line may go on behind the local name, as it does with a domain; that a
+  // host1 accepts the lines of a host12 too is the price.
   if (!beginsWith(Util::toLower(fields[HostField]), hostName) || "k" + fields[CodeField] != name_)
     return;
   const std::string instance = instanceName(fields[CodeField], fields[InstanceField]);
@@ -257,8 +257,8 @@ bool UNIXMonitoringServer::startInstance(const std::string &instance, PatchError
   return started;
 }
 
-// KEEP(server-stop-unchecked): a failing script is a failure, whether or not the process has gone; the
-// server's script, unlike the agents', waits for the end itself.
+// KEEP(server-stop-unchecked): unlike for an agent, a failing script is a failure whether or not the process
+// has gone: a server counts as stopped on its script's word alone.
 bool UNIXMonitoringServer::stopInstance(const std::string &instance, PatchError *err) {
   LOG_TRACE("stopInstance(%s) %s", instance.c_str(), "entry");
   static const ControlFailure failure = {PatchError::ServerInstanceFailed, "ERROR_STOP_SRV_INST",
