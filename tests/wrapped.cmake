@@ -8,6 +8,7 @@ set(wrapped_calls
   dup2
   execvp
   fork
+  fsync
   getcwd
   getpwuid
   getuid

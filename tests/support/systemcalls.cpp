@@ -117,6 +117,7 @@ int __real_open(const char *path, int flags, ...);
 ssize_t __real_read(int descriptor, void *buffer, size_t size);
 ssize_t __real_write(int descriptor, const void *buffer, size_t size);
 int __real_close(int descriptor);
+int __real_fsync(int descriptor);
 off_t __real_lseek(int descriptor, off_t offset, int whence);
 int __real_access(const char *path, int mode);
 int __real_stat(const char *path, struct stat *status);
@@ -186,6 +187,10 @@ int __wrap_close(int descriptor) {
   if (result != 0)
     state().journal.push_back({"close of nothing", std::to_string(descriptor)});
   return fails("close") ? -1 : result;
+}
+
+int __wrap_fsync(int descriptor) {
+  return fails("fsync") ? -1 : __real_fsync(descriptor);
 }
 
 off_t __wrap_lseek(int descriptor, off_t offset, int whence) {

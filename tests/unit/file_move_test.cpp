@@ -366,4 +366,29 @@ TEST_F(FileMoveTest, CopyOfASourceThatVanishedFailsAfterTheTargetWasDeleted) {
             copied({deletingTarget(target()), notLinked(source(), target(), "No such file or directory")}));
 }
 
+TEST_F(FileMoveTest, SourceGivenWithASlashIsAMissingOne) {
+  writeSource();
+  File file(source() + "/");
+  EXPECT_TRUE(file.moveFile(target(), true));
+  EXPECT_EQ(logLines(), moved({notAFile(source() + "/")}));
+  EXPECT_FALSE(file.copyFile(target(), false));
+  EXPECT_EQ(logLines(), copied({notAFile(source() + "/")}));
+  EXPECT_EQ(read(source()), "new");
+  EXPECT_FALSE(isThere(target()));
+}
+
+TEST_F(FileMoveTest, RecursiveDeleteTakesDirectoriesOnly) {
+  File missing(source());
+  EXPECT_FALSE(recursiveDelete(&missing));
+  EXPECT_EQ(logLines(),
+            (LogLines{fileTrace("loadDir() entry"), fileTrace("Unable to delete directory [" + source() +
+                                                              "]: rc = 2, No such file or directory")}));
+  File file(writeSource());
+  EXPECT_FALSE(recursiveDelete(&file));
+  EXPECT_EQ(logLines(),
+            (LogLines{fileTrace("loadDir() entry"),
+                      fileTrace("Unable to delete directory [" + source() + "]: rc = 20, Not a directory")}));
+  EXPECT_EQ(read(source()), "new");
+}
+
 } // namespace

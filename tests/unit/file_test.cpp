@@ -132,6 +132,15 @@ TEST_F(FileTest, RootDirectoryWithoutItsSlashIsNothing) {
   EXPECT_EQ(root.getPath(), "/");
 }
 
+TEST_F(FileTest, RootDirectoryThatWasAskedToBeMadeIsADirectoryWithoutAParent) {
+  File root("/");
+  EXPECT_TRUE(root.mkdir());
+  EXPECT_TRUE(root.isDirectory());
+  EXPECT_EQ(root.getPath(), "/");
+  EXPECT_EQ(root.getName(), "/");
+  EXPECT_EQ(root.getParentPath(), "/");
+}
+
 TEST_F(FileTest, LinksAreFollowed) {
   write("file", "12345");
   makeDirectory("dir");
@@ -233,6 +242,12 @@ TEST_F(FileTest, AbsolutePathIsNotNormalised) {
 TEST_F(FileTest, AbsolutePathInTheRootDirectoryHasOneSlash) {
   fs::current_path("/");
   EXPECT_EQ(File("no-such-name").getAbsolutePath(), "/no-such-name");
+}
+
+TEST_F(FileTest, AbsolutePathIsKeptWhateverDirectoryARelativeOneWouldBePutBelow) {
+  EXPECT_EQ(File("/gone/a").getAbsolutePath("/other"), "/gone/a");
+  EXPECT_EQ(File("gone/a").getAbsolutePath("/other"), "/other/gone/a");
+  EXPECT_EQ(File("gone/a").getAbsolutePath("/other/"), "/other/gone/a");
 }
 
 TEST_F(FileTest, AbsolutePathFollowsTheCurrentDirectory) {

@@ -345,4 +345,11 @@ TEST_F(StopTest, MissingScriptIsAFailedStopWhileTheProcessRuns) {
   EXPECT_EQ(linesOf("orvcomponent", logLines())[1], trace("orvcomponent", "return code: 2"));
 }
 
+TEST_F(ControlTest, ComponentWithoutACodeNamesNoneToTheScripts) {
+  const auto nameless = running("", {});
+  EXPECT_TRUE(nameless->startInstance("", nullptr));
+  EXPECT_TRUE(nameless->stopInstance("", nullptr));
+  EXPECT_EQ(journal(), (Names{"QuillAgent [start]", "QuillAgent [stop] []"}));
+}
+
 } // namespace

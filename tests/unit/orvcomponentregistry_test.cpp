@@ -357,4 +357,10 @@ TEST_F(RegistryTest, RunInformationThatCannotBeReadIsEmpty) {
   EXPECT_TRUE(contains(logLines(), trace("orvcomponentregistry", "unable to read RunInfo file")));
 }
 
+TEST_F(RegistryTest, EndOfAnotherRegistryLeavesTheOneInstance) {
+  ORVComponentRegistry *const instance = ORVComponentRegistry::getInstance();
+  { const ORVComponentRegistry another; }
+  EXPECT_EQ(ORVComponentRegistry::getInstance(), instance);
+}
+
 } // namespace

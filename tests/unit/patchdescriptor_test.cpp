@@ -352,6 +352,13 @@ TEST_F(DescriptorTest, CopyHoldsEverythingAndOwnsItsLevel) {
   EXPECT_EQ(copy.getPostCommands(), Names{"3"});
 }
 
+TEST_F(DescriptorTest, CopyOfOneThatHasReadNothingHasNoLevel) {
+  const PatchDescriptor original;
+  const PatchDescriptor copy(original);
+  EXPECT_EQ(copy.getVersion(), nullptr);
+  EXPECT_EQ(copy.getProductCode(), "");
+}
+
 TEST_F(DescriptorTest, PropertyIsReadOrReportedWithoutALogLine) {
   const Section section = sectionOf("S", {{"key", "one, two"}});
   PatchError err{99, "earlier"};

@@ -407,4 +407,16 @@ TEST_F(DependentsTest, ProductThatHasLeftTheRegistryIsPassedOver) {
                                   "Attempting to start instance []", StartDone}));
 }
 
+TEST_F(DependentsTest, ProductThatHasLeftTheRegistryIsNotPrinted) {
+  installAgents({"yn", "xe"});
+  setRunning({{"yn", "11"}, {"xe", "12", "host_x"}});
+  const Processor kxe = withDependents({"yn"});
+  stopLines(kxe);
+  std::filesystem::remove(home() + "registry/xelpp266.ver");
+  delete ORVComponentRegistry::getInstance();
+  const Printed printed = printedBy([&] { return kxe->printDependentsList(nullptr); });
+  EXPECT_TRUE(printed.result);
+  EXPECT_EQ(printed.out, Heading + "    kyn\n\n");
+}
+
 } // namespace

@@ -314,6 +314,33 @@ TEST_F(FileListTest, OneFileMayBeListedByItself) {
   EXPECT_EQ(ownLines(), LogLines{mapped("bin/agent")});
 }
 
+TEST_F(FileListTest, DirectoryThatIsGoneListsNothing) {
+  makeDirectory("tmp/kxe/updated_files/dir");
+  const Processor kxe = processor();
+  fs::current_path(sourceRoot());
+  fs::create_symlink("dir", "link");
+  File directory("./dir");
+  File link("./link");
+  fs::remove("dir");
+  for (File *entry : {&directory, &link}) {
+    const Printed printed = printedBy([&] { return kxe->listFile(entry, nullptr); });
+    EXPECT_TRUE(printed.result);
+    EXPECT_EQ(printed.out, "");
+  }
+}
+
+TEST_F(FileListTest, LinkToAnotherFileSystemIsEntered) {
+  const std::string elsewhere = "/proc/sys/kernel/random/";
+  const Processor kxe = processor();
+  fs::create_symlink(elsewhere, home() + "link");
+  File link(home() + "link");
+  std::string listed;
+  for (const std::string &name : listedNames(elsewhere))
+    listed += "    " + home() + home() + "link/" + name + "\n";
+  ASSERT_NE(listed, "");
+  EXPECT_EQ(printedBy([&] { return kxe->listFile(&link, nullptr); }).out, listed);
+}
+
 /// The directory from which the call is made cannot be entered again, though it could be left.
 class NoWayBackTest : public FileListTest {
 public:

@@ -307,4 +307,15 @@ TEST_F(LifecycleTest, SelfCheckPrintsItsBannerAndReportsThatTheSamplePatchIsMiss
   EXPECT_THAT(printed.err, StartsWith("Can't initialize patch processor, Error: "));
 }
 
+TEST_F(LifecycleTest, SelfCheckThatFindsTheSamplePatchHasNothingToReport) {
+  makePatch("kzz_unix_vema_fp0001.tar", patchIni("kzz"));
+  std::filesystem::current_path(home() + "patches");
+  const Printed printed = printedBy([] {
+    patchProcessorSelfCheck();
+    return true;
+  });
+  EXPECT_EQ(printed.err, "");
+  EXPECT_EQ(read(home() + "tmp/kzz/patch.ini"), patchIni("kzz"));
+}
+
 } // namespace

@@ -56,6 +56,17 @@ TEST_F(OsAgentTest, StoppedAgentGetsTheResultAndIsStarted) {
   EXPECT_EQ(journal(), Names{"QuillAgent [start] [ox]"});
 }
 
+TEST_F(OsAgentTest, ResultThatCannotBeWrittenDoesNotStopTheAgent) {
+  makeDirectory("vmaorv6/agentdepot");
+  std::filesystem::create_symlink("/dev/full", resultFile());
+  const Processor kxe = stopped({{"ox", "11"}});
+  EXPECT_TRUE(kxe->startOSAgentIfNeeded(0, nullptr));
+  EXPECT_EQ(ownLines(),
+            pps({Entry, "Writing out: " + resultFile(),
+                 "Unable to write file: " + resultFile() + ". No space left on device", Succeeded}));
+  EXPECT_EQ(journal(), Names{"QuillAgent [start] [ox]"});
+}
+
 struct ResultCode {
   int code;
   const char *text;

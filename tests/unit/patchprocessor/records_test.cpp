@@ -52,6 +52,7 @@ INSTANTIATE_TEST_SUITE_P(
                       VersionFile{"kxe_unix_vema_1.tar", "kxe", "xeunix.ver"},
                       VersionFile{"kxe_li6243_vema_1.tar", "xe", "xeli6243.ver"},
                       VersionFile{"kqa_lpp266_vema_1.tar", "kqa", "qalpp266.ver"},
+                      VersionFile{"kxe_lpp266_vema_1.tar", "", "lpp266.ver"},
                       VersionFile{"kox_lpp266_vems_1.tar", "kox", "oxvms.ver"},
                       VersionFile{"kpt_lpp266_vems_1.tar", "kpt", "ptvms.ver"},
                       VersionFile{"kqa_lpp266_vems_1.tar", "kqa", "qalpp266.ver"},

@@ -183,6 +183,16 @@ TEST_F(FileFailureTest, DirectoryWhoseModeCannotBeSetIsMadeAllTheSame) {
   EXPECT_EQ(modeOf(home() + "a/b"), 0755U);
 }
 
+TEST_F(FileFailureTest, DirectoryWhoseModeCannotBeLookedUpKeepsTheOneItWasMadeWith) {
+  const UmaskScope usual(022);
+  failCall("stat", EIO).on(home() + "a/b/");
+  File directory(home() + "a/b");
+  EXPECT_TRUE(directory.mkdir());
+  EXPECT_EQ(callsOf("chmod", home() + "a/b/"), 0);
+  EXPECT_EQ(modeOf(home() + "a"), 0777U);
+  EXPECT_EQ(modeOf(home() + "a/b"), 0755U);
+}
+
 TEST_F(FileFailureTest, DirectoryThatCannotBeOpenedHasEmptyLists) {
   write("dir/file", "");
   makeDirectory("dir/sub");

@@ -136,6 +136,43 @@ TEST_F(RefusedTest, VersionFileThatCannotBeWrittenToTheEndIsLoggedAndThePatchGoe
       1);
 }
 
+/// What can still fail when the text has been written, and how often it succeeds before.
+struct LateFailure {
+  const char *call;
+  int after;
+};
+
+class VersionOnDiskTest : public RefusedTest, public ::testing::WithParamInterface<LateFailure> {};
+
+TEST_P(VersionOnDiskTest, FailureIsLoggedAndThePatchGoesOn) {
+  const std::string path = install("xelpp266.ver", "06200000");
+  const Processor kxe = processor();
+  failCall(GetParam().call, EIO).after(GetParam().after).times(1);
+  PatchError err;
+  EXPECT_TRUE(kxe->updatePatchVerFile(&err));
+  EXPECT_EQ(recordOf(err), NoError);
+  EXPECT_EQ(ownLines(), (LogLines{pp("PatchProcessor::updatePatchVerFile() entry"),
+                                  ppError("Could not update VRMF for " + path + ": Input/output error"),
+                                  pp("PatchProcessor::updatePatchVerFile() = 1")}));
+  EXPECT_NE(read(path).find("VRMF = 06200001\n"), std::string::npos);
+}
+
+// Before the close of the version file come those of five lines of the log and that of the reader.
+INSTANTIATE_TEST_SUITE_P(Calls, VersionOnDiskTest,
+                         ::testing::Values(LateFailure{"fsync", 0}, LateFailure{"close", 6}),
+                         [](const auto &test) { return test.param.call; });
+
+TEST_F(RefusedTest, FilesMoveWhenTheDiskCannotBeToldToWriteFirst) {
+  write("tmp/kxe/updated_files/bin/agent", "new");
+  const Processor kxe = processor();
+  failCall("open", EMFILE).on(".");
+  PatchError err;
+  EXPECT_TRUE(kxe->moveFiles(&err));
+  EXPECT_EQ(recordOf(err), NoError);
+  EXPECT_EQ(callsOf("open", "."), 1);
+  EXPECT_EQ(read(home() + "bin/agent"), "new");
+}
+
 TEST_F(RefusedTest, HistoryThatCannotBeOpenedNamesTheReason) {
   const Processor kxe = processor();
   const std::string path = home() + "patchlogs/patches.hist";

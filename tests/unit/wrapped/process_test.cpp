@@ -163,6 +163,20 @@ TEST_F(ProcessFailureTest, ErrorNumberOfTheExecutionIsTheStatus) {
             runTraces("true", {processError("error calling execvp = 7: Argument list too long")}));
 }
 
+TEST_F(ProcessFailureTest, ChildThatCannotDoAnythingSaysSoThreeTimes) {
+  const CapturedRun result = runUnder([] {
+    failCall("dup2", EBUSY);
+    failCall("execvp", E2BIG);
+  });
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, E2BIG);
+  EXPECT_EQ(result.out + result.err, "");
+  EXPECT_EQ(ownStdout_ + ownStderr_, "");
+  EXPECT_EQ(logLines(),
+            runTraces(WritesToBoth, {processError("Error duping STDOUT"), processError("Error duping STDERR"),
+                                     processError("error calling execvp = 7: Argument list too long")}));
+}
+
 TEST_F(ProcessFailureTest, InterruptedWaitIsTakenUpAgain) {
   failCall("wait", EINTR).times(2);
   const CapturedRun result = captureShell("echo x; exit 4");
@@ -200,6 +214,15 @@ TEST_F(ProcessFailureTest, OutputThatCannotBeReadIsLeftOut) {
   EXPECT_EQ(result.rc, 3);
   EXPECT_EQ(result.out + result.err, "");
   EXPECT_EQ(logLines(), runTraces(WritesToBoth, {}));
+}
+
+TEST_F(ProcessFailureTest, InterruptedReadIsTakenUpAgain) {
+  failCall("read", EINTR).times(2);
+  const CapturedRun result = captureShell(WritesToBoth);
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.out, "to-out\n");
+  EXPECT_EQ(result.err, "to-err\n");
+  EXPECT_EQ(callsOf("read"), 4);
 }
 
 } // namespace

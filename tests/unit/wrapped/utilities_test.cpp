@@ -45,6 +45,11 @@ TEST_F(LookUpFailureTest, UserZeroIsRoot) {
   EXPECT_EQ(Util::getUserName(), "root");
 }
 
+TEST_F(LookUpFailureTest, HostThatTheSystemDoesNotNameHasAnEmptyName) {
+  failCall("uname", EFAULT);
+  EXPECT_EQ(Util::getHostName(), "");
+}
+
 struct NodeName {
   const char *name;
   const char *node;
@@ -150,6 +155,11 @@ TEST_F(ReadFileFailureTest, FileThatCannotBeOpenedIsAnInvalidArgument) {
 
 TEST_F(ReadFileFailureTest, FileOfNegativeSizeIsAnInvalidArgument) {
   failCall("lseek", EINVAL);
+  expectFailure(InvalidArgument, {});
+}
+
+TEST_F(ReadFileFailureTest, FileWhoseStartIsNotFoundAgainIsAnInvalidArgument) {
+  failCall("lseek", EIO).after(1);
   expectFailure(InvalidArgument, {});
 }
 
