@@ -7,6 +7,7 @@ import pytest
 from support import Patch
 
 from catalogue import text
+from productsite import SUCCESS
 
 LIMIT = 1023  # no text of the catalogue is longer once it is filled
 LONG = "x" * 5000
@@ -41,6 +42,15 @@ def test_an_odd_home(site, path):
     assert (result.status, result.out) == (2, b"")
     assert result.err == os.fsencode(text("ERROR_ORV_HOME", f"{path}/")[:LIMIT]) + b"\n"
     assert site.listed() == []
+
+
+def test_an_empty_home_is_the_root_directory(site):
+    """Nobody may write there: each line of the log is lost with a message, and the work is done."""
+    site.user = "nobody" if os.geteuid() == 0 else None
+    path = site.descriptor(Patch("ox").descriptor_text())
+    result = site.run("-h", "", "-vi", path)
+    assert (result.status, result.out) == (0, f"\n{path} is valid\n\n{SUCCESS}".encode())
+    assert set(result.err.splitlines()) == {text("LOG_CANT_WRITE", "/patchlogs/orvpatch.log").encode()}
 
 
 def test_a_folder_of_odd_names(site):
