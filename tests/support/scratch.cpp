@@ -49,6 +49,7 @@ void ScratchHome::SetUp() {
   ASSERT_NE(mkdtemp(pattern.data()), nullptr);
   home_ = pattern + "/";
   startDirectory_ = fs::current_path().string();
+  fs::current_path("/"); // the checkout may lie where another user, whom a test may become, cannot return to
   startPath_ = valueOf("PATH");
   setenv("QUILLHOME", home_.c_str(), 1);
   unsetenv("PATCH_DEBUG");
