@@ -12,6 +12,8 @@ import random
 
 import pytest
 
+from .check import Bench
+
 
 def pytest_configure(config):
     config.addinivalue_line("markers", "faults: injects failures into the program, or kills it")
@@ -44,3 +46,12 @@ class Choice:
 @pytest.fixture(scope="session")
 def choice():
     return Choice()
+
+
+@pytest.fixture(scope="module")
+def benches(program):
+    """The bench of each scenario by its name, made when it is first asked for."""
+    made = {}
+    yield lambda name: made.get(name) or made.setdefault(name, Bench(program, name))
+    for bench in made.values():
+        bench.close()

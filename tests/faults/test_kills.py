@@ -7,21 +7,12 @@ import signal
 import pytest
 
 from . import kills
-from .check import Bench
 from .scenario import NEW_LEVEL, NEW_MODE
 
 pytestmark = pytest.mark.faults
 
 PARTS = 10
 SAMPLE = {"install": 20, "report": 6}
-
-
-@pytest.fixture(scope="module")
-def benches(program):
-    made = {}
-    yield lambda name: made.get(name) or made.setdefault(name, Bench(program, name))
-    for bench in made.values():
-        bench.close()
 
 
 class KilledRun:

@@ -6,7 +6,7 @@ the call was made; see rules.py for the calls and prediction.py for the road.
 
 import pytest
 
-from .check import Bench, Run, replayed
+from .check import Run, replayed
 from .rules import RULES
 from .scenario import SCENARIOS
 
@@ -14,14 +14,6 @@ pytestmark = pytest.mark.faults
 
 PARTS = 20
 SAMPLE = {"install": 100, "report": 40, "failure": 60}
-
-
-@pytest.fixture(scope="module")
-def benches(program):
-    made = {}
-    yield lambda name: made.get(name) or made.setdefault(name, Bench(program, name))
-    for bench in made.values():
-        bench.close()
 
 
 @pytest.mark.parametrize("part", range(PARTS))
