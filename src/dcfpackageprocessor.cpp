@@ -14,11 +14,11 @@
 
 namespace {
 
-/// Whether the path is neither a regular file nor a directory, by its type itself: File::isFile also calls a
-/// device or a pipe a file.
+/// Whether the path, which is no directory, is no regular file either, by its type itself: File::isFile also
+/// calls a device or a pipe a file.
 bool isSpecial(const std::string &path) {
   struct stat status = {};
-  return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode);
+  return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode);
 }
 
 /// What a target demands of the system.
@@ -69,11 +69,8 @@ bool isSupported(const std::string &home, const PatchFileName &name) {
   return false;
 }
 
-/// Target of a patch file by the third part of its name.
 std::string targetOf(PatchProcessor &processor) {
-  const std::vector<std::string> parts =
-      Util::tokenizeString(File(processor.getPatchFilename()).getName(), "_");
-  return parts.size() < 3 ? "" : parts[2];
+  return PatchFileName(File(processor.getPatchFilename()).getName()).getTarget();
 }
 
 } // namespace

@@ -24,8 +24,9 @@ bool isLeftRunning(const std::string &code, const std::string &instance) {
   return true;
 }
 
+/// Of codes that the patch's own product has joined, so that there is at least one.
 bool meansAll(const std::vector<std::string> &codes) {
-  return !codes.empty() && codes.front() == "all";
+  return codes.front() == "all";
 }
 
 /// The component of a listed product, unless it is not installed or nothing of it runs.
