@@ -59,7 +59,10 @@ class Goal(NamedTuple):
     found: float
 
     def row(self):
-        return [self.what, f"{self.limit:.3g}", f"{self.found:.3f}", "met" if round(self.found, 3) <= self.limit else "**missed**"]
+        met = round(self.found, 3) <= self.limit
+        excess = f"{(self.found / self.limit - 1) * 100:.0f} %"
+        verdict = "met" if met else f"**missed** by {excess}: [why](#the-goals-that-are-missed)"
+        return [self.what, f"{self.limit:.3g}", f"{self.found:.3f}", verdict]
 
 
 def goals(trials):
