@@ -2,11 +2,16 @@
 
 import re
 import subprocess
+import sys
 from pathlib import Path
 
 import pytest
 
 ROOT = Path(__file__).resolve().parents[2]
+sys.path.insert(0, str(ROOT / "tests/mutate"))
+
+import mutants  # noqa: E402
+
 SOURCES = sorted([*ROOT.glob("src/**/*.cpp"), *ROOT.glob("src/**/*.h")])
 HEADERS = [path for path in SOURCES if path.suffix == ".h"]
 
@@ -87,6 +92,12 @@ def test_every_oddity_is_documented_and_held_by_a_test():
     assert in_code, "no oddity found: the pattern is broken"
     assert in_document == in_code, "docs/decisions.md and the sources name different oddities"
     assert in_tests == in_code, "the tests and the sources name different oddities"
+
+
+def test_a_mutant_that_may_live_can_still_be_made():
+    possible = {mutant.name for mutant in mutants.all_mutants(ROOT)}
+    gone = mutants.listed_survivors() - possible
+    assert not gone, "listed in tests/mutate/survivors.txt, but its line is no longer in the sources"
 
 
 def test_scripts_can_be_run():

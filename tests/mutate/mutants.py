@@ -2,7 +2,10 @@
 
 import random
 import re
+from pathlib import Path
 from typing import NamedTuple
+
+SURVIVORS = Path(__file__).with_name("survivors.txt")
 
 
 class Mutant(NamedTuple):
@@ -14,7 +17,9 @@ class Mutant(NamedTuple):
 
     @property
     def name(self):
-        return f"{self.file}:{self.line} [{self.kind}] {self.before.strip()} -> {self.after.strip() or '(deleted)'}"
+        """Without the line's number, which changes with every line above it."""
+        before, after = (" / ".join(map(str.strip, text.split("\n"))) for text in (self.before, self.after))
+        return f"{self.file} [{self.kind}] {before} -> {after}"
 
 
 OPERATORS = [("==", "!="), ("!=", "=="), ("<=", "<"), (">=", ">"), (" < ", " <= "), (" > ", " >= "),
@@ -124,3 +129,9 @@ def apply(mutant, text):
     height = mutant.before.count("\n") + 1
     lines[mutant.line - 1:mutant.line - 1 + height] = mutant.after.split("\n")
     return "\n".join(lines) + "\n"
+
+
+def listed_survivors():
+    """Names of the mutants whose survival has its reason."""
+    lines = SURVIVORS.read_text().splitlines()
+    return {line.rsplit(" | ", 1)[0] for line in lines if line and not line.startswith("#")}
