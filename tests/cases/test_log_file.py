@@ -104,6 +104,24 @@ def test_a_patch_is_applied_under_patch_debug_but_not_recorded_without_the_folde
     assert site.changes() == ["+ bin/tool", "* registry/oxlpp266.ver"]
 
 
+def test_under_patch_debug_the_report_stands_among_the_lines_of_its_steps(site):
+    site.home.component("ox")
+    result = site.report(Patch("ox").file("bin/tool"), env={"PATCH_DEBUG": ""})
+    steps = ["TRACE (dcfpackageprocessor): DCFPackageProcessor::testRun() entry\n",
+             "TRACE (patchprocessor): PatchProcessor::cleanUp() = 1\n",
+             f"\n{'=' * 70}\n",
+             "TRACE (patchprocessor): PatchProcessor::testRun() entry\n",
+             "TRACE (patchprocessor): PatchProcessor::listFiles() entry\n",
+             "/bin/tool",
+             "\n\nTRACE (patchprocessor): PatchProcessor::listFiles() exit\n",
+             "TRACE (patchprocessor): PatchProcessor::testRun() = 1\n"]
+    _, begin, rest = without_times(result.out.decode()).partition(steps[0])
+    assert begin
+    for step in steps[1:]:
+        before, found, rest = rest.partition(step)
+        assert found, f"{step!r} does not follow in its place:\n{before}"
+
+
 def complaints(site, count):
     return (text("LOG_CANT_WRITE", f"{site.home.prefix}patchlogs/orvpatch.log") + "\n") * count
 

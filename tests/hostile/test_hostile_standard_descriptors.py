@@ -22,8 +22,8 @@ def seen(result, closed):
 
 @pytest.fixture
 def patch(patch_dir):
-    return Patch("ox").file("bin/tool").script(
-        "look.sh", "post", body='ls /proc/self/fd | sed -n 1,3p | tr "\\n" " "; echo said; echo cried >&2').write(patch_dir)
+    look = 'readlink -v /proc/$$/fd/0 /proc/$PPID/fd/0 /proc/$PPID/fd/1 /proc/$PPID/fd/2; echo cried >&2'
+    return Patch("ox").file("bin/tool").script("look.sh", "post", body=look).write(patch_dir)
 
 
 @combination
@@ -37,9 +37,13 @@ def test_an_installation_does_the_same(program, product, patch, closed):
     assert product.instances() == [("ox", "")]
     log = product.log()
     assert log.preamble == "" and len(log.runs) == 1
-    # The commands of a patch find all three open.
-    assert log.messages("TRACE", "patchprocessor").count("stdOut: 0 1 2 said\n") == 1
-    assert log.messages("TRACE", "patchprocessor").count("stdErr: cried\n") == 1
+    messages = log.messages("TRACE", "patchprocessor")
+    assert messages.count("stdErr: cried\n") == 1
+    # What a command of the patch has seen of its standard input, and of the program's three descriptors.
+    [said] = [message for message in messages if message.startswith("stdOut: ")]
+    own_input, *programs = said.removeprefix("stdOut: ").splitlines()
+    assert own_input == programs[0] and len(programs) == 3
+    assert [programs[fd] for fd in closed] == ["/dev/null" for _ in closed]
 
 
 @combination

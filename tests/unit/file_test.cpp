@@ -192,13 +192,19 @@ TEST_F(FileTest, InitializeTakesTheSnapshotAnew) {
 
 TEST_F(FileTest, InitializeForgetsBothListings) {
   File directory(makeDirectory("dir"));
-  EXPECT_TRUE(directory.listFiles()->empty());
-  EXPECT_TRUE(directory.listSubDirectories()->empty());
+  File again(directory);
+  for (File *file : {&directory, &again}) {
+    EXPECT_TRUE(file->listFiles()->empty());
+    EXPECT_TRUE(file->listSubDirectories()->empty());
+  }
   write("dir/new", "");
   makeDirectory("dir/new-sub");
   directory.initialize();
   EXPECT_EQ(directory.listSubDirectories()->size(), 1U);
   EXPECT_EQ(directory.listFiles()->size(), 1U);
+  again.initialize();
+  EXPECT_EQ(again.listFiles()->size(), 1U); // asked in the other order: either list is read with the other
+  EXPECT_EQ(again.listSubDirectories()->size(), 1U);
 }
 
 TEST_F(FileTest, EntryOfADirectoryIsNamedBelowIt) {

@@ -236,6 +236,11 @@ TEST_F(ReadLinesTest, DirectoryHasNoLines) {
 TEST_F(ReadLinesTest, OmittedNameHasNoLines) {
   EXPECT_EQ(Util::readFileByLines(nullptr, lines_), InvalidArgument);
   EXPECT_EQ(lines_, Lines{});
+  // As printf shows a null pointer.
+  EXPECT_EQ(logLines(),
+            (LogLines{utilTrace("Util::readFileByLines((null)) entry"),
+                      utilTrace("Util::readFile((null)) entry"), error("utilities.cpp", "filename omitted"),
+                      utilTrace("Util::readFile((null))=22((nil)) exit")}));
 }
 
 } // namespace
