@@ -307,6 +307,13 @@ TEST_F(IsRunningTest, OwnerIsTrimmed) {
   EXPECT_EQ(owner_, "quill");
 }
 
+TEST_F(IsRunningTest, OnlyBlanksEndTheOwner) {
+  setPsOfProcess("47", "  47 ?   00:00:00 agent\n");
+  setPsOfAll("EX+o~r,v_q-u.i|l=l$ 47 1\n");
+  EXPECT_TRUE(isRunning("47", owner_));
+  EXPECT_EQ(owner_, "EX+o~r,v_q-u.i|l=l$");
+}
+
 TEST_F(IsRunningTest, ProcessWithoutAnOwnerRunsAllTheSame) {
   owner_.clear();
   setPsOfProcess("47", "  47 ?   00:00:00 agent\n");

@@ -2,11 +2,13 @@
 #include "logger.h"
 
 #include <cerrno>
+#include <ctime>
 #include <regex>
 #include <string>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include "systemcalls.h"
 
@@ -72,6 +74,17 @@ TEST_F(LoggerFailureTest, InterruptedWriteIsTakenUpAgain) {
 }
 
 TEST_F(LoggerFailureTest, UnknownTimeIsAnEmptyText) {
+  const std::string before = read(glbLogFileName);
+  failCall("localtime", EOVERFLOW);
+  setLine(5);
+  logTrace(LOG_COMPONENT, "timeless");
+  EXPECT_EQ(read(glbLogFileName), before + "TRACE  (logger_test,5): timeless\n");
+}
+
+TEST_F(LoggerFailureTest, UnknownTimeIsNotThatOfAnEarlierLine) {
+  LOG_TRACE("in time");
+  for (const time_t second = time(nullptr); time(nullptr) == second;) // lines of one second share its text
+    usleep(10000);
   const std::string before = read(glbLogFileName);
   failCall("localtime", EOVERFLOW);
   setLine(5);
