@@ -80,6 +80,12 @@ TEST_F(MkdirTest, RelativePathIsMadeWithAllItsParents) {
   EXPECT_EQ(logLines(), mkdirTraces({creating("a/"), creating("a/b/"), creating("a/b/c/")}, true));
 }
 
+TEST_F(MkdirTest, OnlySlashesDivideAPath) {
+  const std::string odd = "a~b c,d;e|f_g\\h.";
+  EXPECT_TRUE(File(odd + "/sub").mkdir());
+  EXPECT_EQ(logLines(), mkdirTraces({creating(odd + "/"), creating(odd + "/sub/")}, true));
+}
+
 TEST_F(MkdirTest, AbsolutePathIsMadeBelowWhatExists) {
   makeDirectory("a");
   fs::permissions(home() + "a", fs::perms(0700));
