@@ -232,6 +232,11 @@ TEST_F(RegistryTest, EveryPrerequisiteLineAddsItsFirstPiece) {
             (Names{"kox", "none", "qalpp266 ", "none", "none", "NONE"}));
 }
 
+TEST_F(RegistryTest, OnlyBarsDivideAPrerequisite) {
+  const ORVComponent *component = componentOf("VRMF = 06100000\npreReqALL = k~o x,y;z_-.:=|q\n");
+  EXPECT_EQ(component->getPrereqs(), Names{"k~o x,y;z_-.:="});
+}
+
 TEST_F(RegistryTest, FileWithoutALevelIsReadButYieldsNoComponent) {
   EXPECT_EQ(componentOf("desc = Agent\n"), nullptr);
   EXPECT_EQ(componentOf("desc = Agent\nVRMF =\n"), nullptr);

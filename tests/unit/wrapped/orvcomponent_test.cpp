@@ -49,6 +49,15 @@ TEST_F(ComponentFailureTest, ProcessRunsWithoutAnOwnerWhenThatCannotBeAskedFor) 
   EXPECT_EQ(logLinesOf("orvcomponent"), own({"unable to determine owner of process id: 4711"}));
 }
 
+// KEEP(host-prefix)
+TEST_F(ComponentFailureTest, HostThatRepeatsTheLocalNamesLetterIsTakenToo) {
+  answerNodeName("aa");
+  setRunning({{"ox", "11"}});
+  const ORVComponent kox(home(), "ox", "Sample", "06200000", "", {}, ORVComponent::TYPE_AGENT,
+                         "FIELDSEP=|\naaa|ox|11|abc|x\nba|ox|11|other|x\n");
+  EXPECT_EQ(kox.getActiveInstances(), Names{"abc"});
+}
+
 std::string stopText(const std::string &subject, const std::string &kind) {
   return "Unable to stop " + subject + " for product Sample.  The " + kind +
          " for product Sample may be running under a different userid and must be manually stopped before "
