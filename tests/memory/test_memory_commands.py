@@ -10,8 +10,11 @@ from support import Patch
 
 pytestmark = pytest.mark.memory
 
-# Run by a patch's command: notes which descriptors the tool has open, and the states of its children.
-LOOK = 'echo /proc/$PPID/fd/* >>"$QUILLHOME/descriptors"; ps --ppid $PPID -o stat= >>"$QUILLHOME/children"'
+# Run by a patch's command: notes which descriptors the tool has open, and the states of its children. Not before the
+# tool sleeps: until then it may have had no time to close the ends of the pipes that are the child's.
+LOOK = """until grep -q '^State:.S' /proc/$PPID/status; do :; done
+echo /proc/$PPID/fd/* >>"$QUILLHOME/descriptors"
+ps --ppid $PPID -o stat= >>"$QUILLHOME/children\""""
 
 
 @pytest.fixture
