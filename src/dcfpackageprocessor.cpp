@@ -14,11 +14,11 @@
 
 namespace {
 
-/// Whether the path, which is no directory, is no regular file either, by its type itself: File::isFile also
-/// calls a device or a pipe a file.
+/// Whether the path is neither a regular file nor a directory, by its type itself: File::isFile also calls a
+/// device or a pipe a file. A directory that has taken the file's place by now is not passed over in silence.
 bool isSpecial(const std::string &path) {
   struct stat status = {};
-  return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode);
+  return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode);
 }
 
 /// What a target demands of the system.

@@ -77,10 +77,10 @@ ORVComponent::Type typeOf(const std::string &path, const std::string &fileName) 
   return beginsWith(fileName, "zt") ? ORVComponent::TYPE_CLI : ORVComponent::TYPE_AGENT;
 }
 
-/// Between the product code and the extension, which every version file has.
+/// Between the product code and the extension; empty without one.
 std::string archOf(const std::string &fileName) {
   const std::size_t point = fileName.rfind('.');
-  return point < 2 ? "" : fileName.substr(2, point - 2);
+  return point == std::string::npos || point < 2 ? "" : fileName.substr(2, point - 2);
 }
 
 bool isVersionFile(const std::string &fileName) {

@@ -245,6 +245,15 @@ TEST_F(RegistryTest, FileWithoutALevelIsReadButYieldsNoComponent) {
                        trace("orvcomponentregistry", "ORVComponentRegistry::buildComponent exit")));
 }
 
+TEST_F(RegistryTest, NameWithoutAPointBehindTheCodeHasNoArchitecture) {
+  ORVComponentRegistry *empty = registry();
+  for (const char *name : {"x", "ox", "oxlpp266", ".ver", "x.ver", "ox.ver"})
+    empty->buildComponent(write(std::string("registry/") + name, "VRMF = 06100000\n"), "");
+  ASSERT_EQ(empty->getInstalledComponents()->size(), 6U);
+  for (const ORVComponent *component : *empty->getInstalledComponents())
+    EXPECT_EQ(component->getArch(), "") << component->getName();
+}
+
 TEST_F(RegistryTest, UnreadableVersionFileIsSkippedWithATrace) {
   ORVComponentRegistry *empty = registry();
   const std::string missing = home() + "registry/oxlpp266.ver";
