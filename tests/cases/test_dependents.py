@@ -119,6 +119,30 @@ def test_the_os_agent_is_started_once_as_its_default_instance(site):
     assert site.home.read("vmaorv6/agentdepot/rc.txt") == b"0"
 
 
+def test_the_result_of_a_good_run_is_the_code_that_the_record_holds(site):
+    # A stray line, and the clean-up that finds nothing to remove at the second patch of a product, leave theirs.
+    site.home.component("ox")
+    site.home.start("ox")
+    stray = "stray\n" + Patch("ox", exe="kox").descriptor_text()  # no missing optional key takes its code back
+    assert site.install(Patch("ox", descriptor=stray)) == site.done()
+    assert site.home.read("vmaorv6/agentdepot/rc.txt") == b"4"
+    folder = site.home.mkdir("patches")
+    for fixpack in ("fp0001", "fp0002"):
+        Patch("ox", fixpack=fixpack).file("bin/tool").write(folder)
+    assert site.install(folder) == site.done()
+    assert site.home.read("vmaorv6/agentdepot/rc.txt") == b"27"
+
+
+def test_the_os_agent_of_which_one_instance_does_not_stop_is_not_started(site):
+    site.home.component("ox", desc="Linux OS")
+    for instance in ("one", "two"):
+        site.home.start("ox", instance)
+    site.home.fail("stop", "ox", "two")
+    message = text("ERROR_STOP_INST", "two", "Linux OS", "Linux OS")
+    assert site.install(Patch("ox")) == site.failed(15, message)
+    assert site.home.calls() == ["QuillAgent -o one stop ox", "QuillAgent -o two stop ox"]
+
+
 def test_without_the_depot_the_os_agent_is_started_all_the_same(site):
     site.home.component("ox")
     site.home.start("ox")

@@ -180,6 +180,18 @@ def test_files_that_are_no_directory(site):
     assert [entry.result for entry in site.home.history()] == ["FAIL"]
 
 
+def test_a_starting_folder_that_has_gone_ends_the_run_behind_the_move(site):
+    site.home.start("yn")
+    own = site.patch_dir / "own"
+    own.mkdir()
+    control = site.home.read("bin/QuillAgent").decode().replace("\n", f"\nrmdir {own}\n", 1)
+    site.home.write("bin/QuillAgent", control, 0o755)
+    path = site.target(Patch("yn").file("bin/tool"))
+    assert site.install(path, cwd=own).status == 24
+    assert site.home.read("bin/tool") == b"new\n"
+    assert site.home.level("yn") == "06100000" and site.home.instances() == []
+
+
 def test_files_before_the_failing_one_stay_moved(site):
     # Directories are walked before files: a/ has arrived when the file at the top fails.
     site.home.mkdir("tool")

@@ -111,6 +111,15 @@ def test_others_cannot_replace_what_they_may_not_write(ordinary):
     ordinary.home.mkdir("bin", 0o755)
 
 
+@pytest.mark.needs_root
+def test_others_who_replace_a_foreign_file_become_its_owner(ordinary):
+    tool = ordinary.home.write("bin/tool", "old", 0o640)
+    os.chown(tool, 0, 0)
+    assert ordinary.install(Patch("yn").file("bin/tool", "new")).status == 25
+    assert ordinary.home.read("bin/tool") == b"new"
+    assert tool.stat().st_uid == pwd.getpwnam("nobody").pw_uid
+
+
 def test_the_history_names_the_user(ordinary):
     assert ordinary.install(Patch("yn")) == ordinary.done()
     name = ordinary.user or pwd.getpwuid(os.getuid()).pw_name

@@ -226,3 +226,16 @@ def test_files_that_are_no_directory(site):
     message = text("ERROR_PP_SET_CWD", f"{site.home.prefix}tmp/kox/updated_files")
     assert site.report(path) == site.report_failed(24, message, shown)
     assert site.changes() == [*LEFT, "+ tmp/kox/updated_files"]
+
+
+def test_the_code_of_a_clean_up_is_that_of_a_second_report_without_files(site):
+    # After the first patch of a product there is nothing left that the next clean-up could remove.
+    first, second = Patch("ox", fixpack="fp0001"), Patch("ox", fixpack="fp0002")
+    folder = site.target(first.directory(), second.directory())
+    assert site.report(folder).status == 0
+    for patch in (first, second):
+        Patch("ox", fixpack=patch.fixpack).write(folder)
+    names = site.listed()
+    Patch("ox", fixpack=names[0][-10:-4]).directory().write(folder)
+    result = site.report(folder)
+    assert (result.status, result.err) == (27, f"Unable to remove temporary directory: {site.home.prefix}tmp/kox\n".encode())

@@ -96,3 +96,11 @@ def test_a_stray_line_is_reported_in_the_log_alone(site):
     path = site.descriptor("stray\n" + FULL)
     assert site.validate(path) == site.done(f"\n{path} is valid\n\n")
     assert site.logged("ERROR") == [text("ERROR_INIFILE_PROP")]
+
+
+def test_any_directory_serves_as_home(site, scratch):
+    path = site.descriptor(FULL)
+    folder = scratch / "any"
+    folder.mkdir()
+    assert site.run("-h", folder, "-vi", path) == site.done(f"\n{path} is valid\n\n")
+    assert [entry.name for entry in folder.iterdir()] == ["patchlogs"]

@@ -51,6 +51,14 @@ def test_a_link_to_a_directory_gives_its_files_to_the_home(program, product, pat
     assert os.path.islink(product.path / "tmp/kox/updated_files/lib")
 
 
+@pytest.mark.parametrize("link, destination, status", [("m/in/link", "../tool", 25), ("link", "m/tool", 0)])
+def test_a_link_to_a_file_that_comes_later_ends_the_run(program, product, patch_dir, link, destination, status):
+    # It arrives before its file, and there is nothing yet to give an owner to. Deeper directories come first.
+    archive = RawArchive(PATCH).file("updated_files/m/tool").link(f"updated_files/{link}", destination)
+    assert program.install(product, archive.write(patch_dir)).status == status
+    assert product.exists("m/tool") == (status == 0)
+
+
 def test_a_report_lists_the_files_behind_a_link_and_leaves_them(program, product, patch_dir, foreign):
     archive = RawArchive(PATCH).link("updated_files/lib", str(foreign)).write(patch_dir)
     before = product_tree(product)

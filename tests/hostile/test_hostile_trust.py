@@ -1,6 +1,7 @@
 """Every claim of SECURITY.md, tried out: who can make the user who patches do what, and what keeps them from it."""
 
 import os
+import struct
 import subprocess
 import threading
 import time
@@ -9,7 +10,7 @@ from pathlib import Path
 import pytest
 
 from support import Patch, stubs
-from verdicts import INSTALLED
+from verdicts import INSTALLED, refused
 
 NOBODY = 65534
 
@@ -102,6 +103,35 @@ def test_a_directory_that_the_tool_makes_is_open_to_all(program, product, patch_
     assert sorted(os.listdir(product.path / "new")) == ["gone", "mine"]
 
 
+def set_attribute(path, name, value):
+    try:
+        os.setxattr(path, name, value)
+    except OSError:
+        pytest.skip(f"no attribute {name} on this file system")
+
+
+# a capability set of version 2 that holds net_bind_service; a list of two more entries than the mode has
+CAPABILITY = struct.pack("<5I", 0x02000001, 1 << 10, 0, 0, 0)
+ACCESS_LIST = struct.pack("<I" + "HHI" * 5, 2, 1, 6, 0xFFFFFFFF, 2, 7, 1, 4, 4, 0xFFFFFFFF, 16, 7, 0xFFFFFFFF,
+                          32, 4, 0xFFFFFFFF)
+
+
+@pytest.mark.needs_root
+@pytest.mark.parametrize("name, value", [
+    ("security.capability", CAPABILITY), ("system.posix_acl_access", ACCESS_LIST), ("user.label", b"x")])
+def test_a_replaced_file_loses_its_further_attributes(program, product, patch_dir, name, value):
+    tool = product.write("bin/tool", "old", 0o755)
+    set_attribute(tool, name, value)
+    assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir)) == INSTALLED
+    assert name not in os.listxattr(tool)
+
+
+def test_further_links_to_a_replaced_file_keep_the_old_content(program, product, patch_dir):
+    os.link(product.write("bin/tool", "old"), product.path / "bin/same")
+    assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir)) == INSTALLED
+    assert (product.read("bin/tool"), product.read("bin/same")) == (b"new\n", b"old")
+
+
 # --- other processes on the host ---------------------------------------------------------------------------
 
 def await_command_line(process, text):
@@ -174,12 +204,42 @@ def test_ps_format_hides_running_instances(program, product, patch_dir):
     assert product.calls() == []
 
 
-def test_columns_hides_a_running_console(program, product, patch_dir):
+@pytest.mark.parametrize("variable", [
+    {"COLUMNS": "60"}, {"PS_PERSONALITY": "old"}, {"CMD_ENV": "old"}, {"I_WANT_A_BROKEN_PS": "1"}], ids=str)
+def test_what_hides_a_running_console(program, product, patch_dir, variable):
     product.component("zt")
     product.start_console()
     archive = Patch("zt", target="vecm").file("bin/tool").write(patch_dir)
     assert program.install(product, archive).status == 37
-    assert program.install(product, archive, env={"COLUMNS": "60"}) == INSTALLED
+    assert program.install(product, archive, env=variable) == INSTALLED
+
+
+@pytest.mark.needs_root
+@pytest.mark.parametrize("variable", ["PS_PERSONALITY", "CMD_ENV"])
+def test_a_listing_that_shows_user_numbers_keeps_an_agent_from_being_started(program, product, patch_dir, variable):
+    product.start("ox")
+    archive = Patch("ox").file("bin/tool").write(patch_dir)
+    assert program.install(product, archive, env={variable: "gnu"}).status == 12
+    assert product.instances() == []
+
+
+def test_shellopts_makes_control_scripts_of_bash_do_nothing(program, product, patch_dir):
+    product.start("ox")
+    product.write("bin/QuillAgent", product.read("bin/QuillAgent").replace(b"#!/bin/sh", b"#!/bin/bash"), 0o755)
+    archive = Patch("ox").file("bin/tool").write(patch_dir)
+    assert program.install(product, archive, env={"SHELLOPTS": "noexec"}) == INSTALLED
+    assert product.calls() == [] and product.instances() == [("ox", "")]
+
+
+def test_without_a_path_the_second_patch_of_a_directory_fails(program, product, patch_dir):
+    # What the first one sets back after its commands is an empty path, not a missing one.
+    for fixpack in ("fp0001", "fp0002"):
+        Patch("ox", fixpack=fixpack).file("bin/tool").script("a.sh", "pre").write(patch_dir)
+    without = {"PATH": None}
+    assert program.install(product, patch_dir, env=without) == refused(product, 3, "Bad return code from tar -xf: 2")
+    assert [line.result for line in product.history()] == ["PASS", "FAIL"]
+    kept = {"PATH": "/usr/sbin:/usr/bin:/sbin:/bin"}
+    assert program.install(product, patch_dir, env=kept) == INSTALLED
 
 
 @pytest.mark.skipif(not os.path.exists("/usr/share/locale/de/LC_MESSAGES/tar.mo"), reason="no other language installed")
@@ -192,7 +252,7 @@ def test_the_language_is_that_of_the_children_only(program, product, patch_dir):
 
 @pytest.mark.parametrize("variable", [
     {"POSIXLY_CORRECT": "1"}, {"LC_ALL": "C.UTF-8"}, {"LC_ALL": "xx_YY"}, {"IFS": "p"}, {"QUILLHOME": "/nonexistent/"},
-    {"ENV": "/nonexistent", "BASH_ENV": "/nonexistent"}, {"GREP_OPTIONS": "-c"}, {"TMPDIR": "/nonexistent"}])
+    {"ENV": "/nonexistent", "BASH_ENV": "/nonexistent"}, {"UNIX95": "1"}, {"TMPDIR": "/nonexistent"}], ids=str)
 def test_variables_that_change_nothing(program, product, patch_dir, variable):
     product.start("ox")
     assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir), env=variable) == INSTALLED
