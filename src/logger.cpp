@@ -7,6 +7,7 @@
 #include <ctime>
 #include <iterator>
 #include <string_view>
+#include <utility>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -26,7 +27,13 @@ constexpr std::string_view levelWords[] = {"ERROR ", "INFO  ", "TRACE "};
 // Almost every line fits; a longer one is formatted once more into a string of its size.
 constexpr std::size_t LineSize = 2048;
 
+LogSink logSink;
+
 void writeText(const char *text, std::size_t length) {
+  if (logSink) {
+    logSink({text, length});
+    return;
+  }
   if (glbLogToSTDOUT) {
     fwrite(text, 1, length, stdout);
     return;
@@ -109,6 +116,10 @@ void logInit() {
     glbLogFileName = directory + "/orvpatch.log";
   }
   writeHeader();
+}
+
+LogSink setLogSink(LogSink sink) {
+  return std::exchange(logSink, std::move(sink));
 }
 
 void setLine(int line) {

@@ -7,7 +7,9 @@
 #pragma once
 
 #include <cstdarg>
+#include <functional>
 #include <string>
+#include <string_view>
 
 #include "nls.h"
 
@@ -21,6 +23,13 @@ extern int glbCurLine;             ///< source line of the log call that follows
 /// Chooses the destination (making patchlogs, mode 0755, when missing) and writes the header block.
 /// Needs the home in the environment; called once, before any other log call.
 void logInit();
+
+/// Takes each finished text, a line with its line end, in place of the log file or standard output.
+using LogSink = std::function<void(std::string_view text)>;
+
+/// Redirects the log to `sink`; an empty one puts it back to where logInit sent it. Returns the sink before. A
+/// program that reads a home but must not write to its log uses this in place of logInit.
+LogSink setLogSink(LogSink sink);
 
 /// Stores the source line that the next log call shows in its prefix.
 void setLine(int line);

@@ -362,4 +362,31 @@ TEST_F(LoggerTest, MissingHomeIsReportedOnStandardError) {
   EXPECT_FALSE(isThere(home() + "gone"));
 }
 
+TEST_F(LoggerTest, SinkTakesEachFinishedLineInPlaceOfTheFile) {
+  logInit();
+  const std::string before = log();
+  std::vector<std::string> taken;
+  setLogSink([&taken](std::string_view text) { taken.emplace_back(text); });
+  setLine(7);
+  logError(LOG_COMPONENT, "%s", std::string(5000, 'x').c_str());
+  setLine(8);
+  logTrace(LOG_COMPONENT, "short");
+  EXPECT_TRUE(setLogSink({}));
+  EXPECT_EQ(log(), before);
+  ASSERT_EQ(taken.size(), 2U);
+  EXPECT_TRUE(matches(taken[0], linePattern("ERROR", 7, std::string(5000, 'x'))));
+  EXPECT_TRUE(matches(taken[1], linePattern("TRACE", 8, "short")));
+}
+
+TEST_F(LoggerTest, WithoutASinkTheFileIsWrittenAgain) {
+  logInit();
+  EXPECT_FALSE(setLogSink([](std::string_view) {}));
+  static_cast<void>(setLogSink({}));
+  const std::string before = log();
+  setLine(9);
+  logInfo(LOG_COMPONENT, "back");
+  ASSERT_EQ(log().compare(0, before.size(), before), 0);
+  EXPECT_TRUE(matches(log().substr(before.size()), linePattern("INFO ", 9, "back")));
+}
+
 } // namespace
