@@ -1,0 +1,39 @@
+#include "application.h"
+
+#include <cstdio>
+#include <new>
+
+#include <CLI/CLI.hpp>
+
+#include "commands/command.h"
+#include "commands/commands.h"
+#include "memorylog.h"
+
+std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
+  auto application = std::make_unique<CLI::App>(
+      "Makes, checks and applies patches of the ORV monitoring product, round the installer orvpatch.",
+      "orvpatchctl");
+  application->set_version_flag("--version", "orvpatchctl " ORVPATCHCTL_VERSION);
+  application->require_subcommand(1);
+  addShow(*application, invocation);
+  return application;
+}
+
+int runApplication(int argc, const char *const *argv) {
+  Invocation invocation;
+  const std::unique_ptr<CLI::App> application = makeApplication(invocation);
+  // What is read with the installer's units must not be told in the log of any home.
+  const MemoryLog log;
+  try {
+    application->parse(argc, argv);
+  } catch (const CLI::ParseError &error) {
+    return application->exit(error) == 0 ? Good : CannotJudge;
+  } catch (const JudgementError &error) {
+    fprintf(stderr, "orvpatchctl: %s\n", error.what());
+    return CannotJudge;
+  } catch (const std::bad_alloc &) {
+    fputs("orvpatchctl: out of memory\n", stderr);
+    return CannotJudge;
+  }
+  return invocation.status;
+}

@@ -1,0 +1,16 @@
+#include "commands/command.h"
+
+#include <CLI/CLI.hpp>
+
+CLI::App *addCommand(CLI::App &application, Invocation &invocation, const std::string &name,
+                     const std::string &description) {
+  CLI::App *const command = application.add_subcommand(name, description);
+  command->add_flag("--json", invocation.output.json, "One JSON document on standard output");
+  command
+      ->add_option("--color", invocation.output.color,
+                   "Colours: auto (on a terminal, unless NO_COLOR is set), always or never")
+      ->transform(CLI::CheckedTransformer(std::map<std::string, ColorMode>{
+          {"auto", ColorMode::Auto}, {"always", ColorMode::Always}, {"never", ColorMode::Never}}))
+      ->option_text("WHEN");
+  return command;
+}

@@ -1,0 +1,9 @@
+// One function a command: adds its sub-command, whose callback runs it and stores its status.
+#pragma once
+
+namespace CLI {
+class App;
+}
+struct Invocation;
+
+void addShow(CLI::App &application, Invocation &invocation);

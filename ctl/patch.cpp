@@ -1,0 +1,88 @@
+#include "patch.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include "file.h"
+#include "judgement.h"
+
+namespace {
+
+/// The installer reads a descriptor of any size that fits into memory; no honest one comes near this.
+constexpr std::size_t LargestDescriptor = 16 * 1024 * 1024;
+
+constexpr const char *targetOrder[] = {"vecm", "vems", "veps", "vepd", "vema"};
+
+/// A file without a name, in memory alone, with a path under which it can be read.
+class MemoryFile {
+public:
+  explicit MemoryFile(const std::string &content) : fd_(memfd_create("patch.ini", MFD_CLOEXEC)) {
+    if (fd_ < 0 || ::write(fd_, content.data(), content.size()) != static_cast<ssize_t>(content.size())) {
+      const int error = errno;
+      close(fd_);
+      throw JudgementError(std::string("no memory for patch.ini: ") + strerror(error));
+    }
+  }
+  MemoryFile(const MemoryFile &) = delete;
+  MemoryFile &operator=(const MemoryFile &) = delete;
+  ~MemoryFile() { close(fd_); }
+
+  std::string path() const { return "/proc/self/fd/" + std::to_string(fd_); }
+
+private:
+  int fd_;
+};
+
+std::size_t rankOf(const std::string &path) {
+  const PatchFileName name(File(path).getName());
+  return static_cast<std::size_t>(
+      std::find(std::begin(targetOrder), std::end(targetOrder), name.getTarget()) - std::begin(targetOrder));
+}
+
+/// tar extracts each member of that name in turn, so that the last one stays.
+void readMembers(Patch &patch) {
+  ArchiveReader reader(patch.path);
+  Member member;
+  while (reader.next(member)) {
+    if (member.name == "patch.ini" && member.type == Member::Type::File) {
+      patch.hasDescriptor = true;
+      patch.descriptorText = reader.content(LargestDescriptor);
+    }
+    patch.members.push_back(member);
+  }
+  patch.archiveProblem = reader.problem();
+}
+
+} // namespace
+
+Patch readPatch(const std::string &path) {
+  const std::string file = File(path).getName();
+  Patch patch{path, file, PatchFileName(file), {}, "", false, "", nullptr, {}};
+  readMembers(patch);
+  if (patch.hasDescriptor) {
+    const MemoryFile descriptor(patch.descriptorText);
+    patch.descriptor.reset(PatchDescriptor::parseFile(descriptor.path(), &patch.descriptorError));
+  }
+  return patch;
+}
+
+std::vector<std::string> patchFiles(const std::string &path) {
+  File given(path);
+  if (!given.exists())
+    throw JudgementError("cannot read " + path);
+  if (!given.isDirectory())
+    return {path};
+  std::vector<std::string> files;
+  for (const File *file : *given.listFiles())
+    if (PatchFileName(file->getName()).isValid())
+      files.push_back(file->getPath());
+  if (files.empty())
+    throw JudgementError("no patch in " + path);
+  std::stable_sort(files.begin(), files.end(),
+                   [](const std::string &a, const std::string &b) { return rankOf(a) < rankOf(b); });
+  return files;
+}
