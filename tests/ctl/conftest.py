@@ -1,0 +1,50 @@
+"""What the tests of orvpatchctl work with: the program, a home with its patches, and its JSON documents."""
+
+import json
+import os
+from pathlib import Path
+
+import jsonschema
+import pytest
+
+from support import Patch, Program
+
+CHECKOUT = Path(__file__).resolve().parents[2]
+SCHEMAS = CHECKOUT / "docs/schema"
+
+
+class Ctl:
+    """orvpatchctl: ORVPATCHCTL names the binary, by default the one beside the installer under test."""
+
+    def __init__(self, installer):
+        beside = installer.binary.parent / "orvpatchctl"
+        self.program = Program(binary=os.environ.get("ORVPATCHCTL") or beside)
+
+    def run(self, *words, **options):
+        return self.program.run(*words, **options)
+
+    def document(self, *words, status=0, **options):
+        """The document that `words --json` prints, held against the schema of its command."""
+        result = self.run(*words, "--json", **options)
+        assert result.status == status, (result.status, result.out, result.err)
+        document = json.loads(result.out)
+        schema = SCHEMAS / f"{words[0]}.json"
+        assert schema.exists(), f"no schema for {words[0]}"
+        jsonschema.Draft7Validator(json.loads(schema.read_text())).validate(document)
+        return document
+
+
+@pytest.fixture
+def ctl(program):
+    return Ctl(program)
+
+
+@pytest.fixture
+def write(patch_dir):
+    """write(patch) makes the archive of a patch in the folder of patches and returns its path."""
+
+    def make(patch, **options):
+        assert isinstance(patch, Patch)
+        return patch.write(patch_dir, **options)
+
+    return make
