@@ -1,4 +1,4 @@
-"""A place where the examples of the manual pages come true."""
+"""A place where the examples of the manual pages can be run."""
 
 import os
 import re
@@ -14,7 +14,7 @@ _MARK = "\x01"
 
 
 class Example:
-    """The home /opt/orv, the host vega and the patches in /var/tmp/patches of the pages, under other names.
+    """The home /opt/orv, the host vega and the folders below /root of the pages, under other names.
 
     Commands run in the folder `here`, where orvpatch is on the search path."""
 
@@ -30,7 +30,9 @@ class Example:
         self.environment = {**os.environ, "PATH": f"{bin_folder}:{os.environ['PATH']}", "LC_ALL": "C"}
         self.names = {
             "/opt/orv": str(self.home.path),
-            "/var/tmp/patches": str(self.patches),
+            "/root/patches": str(self.patches),
+            "/root/check": str(folder / "check"),
+            "PATH=/usr/sbin": f"PATH={bin_folder}:/usr/sbin",
             "vega": os.uname().nodename.partition(".")[0],
         }
 
