@@ -50,10 +50,6 @@ class Sample:
         """The level of every component."""
         return [f"{desc}: {self.home.level(code)}" for code, desc in _COMPONENTS.items()]
 
-    def calls(self):
-        """Every call of a control script or a patch script so far."""
-        return self.home.calls()
-
     def _make_fixpack(self):
         folder = self.root / "fixpack2"
         folder.mkdir()
