@@ -51,6 +51,10 @@ public:
   Version *getVersion() const { return version_.get(); } ///< owned by the component
   std::vector<std::string> getActiveInstances() const { return activeInstances_; }
   std::vector<std::string> getPrereqs() const { return prereqs_; }
+  /// Process id of an active instance as the run information holds it, and the owner whom `ps` named; empty
+  /// for an instance that was not found running.
+  std::string getPid(const std::string &instance) const { return lookUp(pids_, instance); }
+  std::string getOwner(const std::string &instance) const { return lookUp(owners_, instance); }
 
 protected:
   /// How a failed start or stop is reported: with the instance's name or without.
