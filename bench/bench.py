@@ -18,6 +18,7 @@ from pathlib import Path
 ROOT = Path(__file__).resolve().parents[1]
 sys.path.insert(0, str(ROOT / "tests"))  # the sample home and the patch builder are those of the tests
 
+import picture  # noqa: E402
 from measure import Meter  # noqa: E402
 from memoryfs import memory_folder  # noqa: E402
 from payloads import PAYLOADS  # noqa: E402
@@ -102,6 +103,8 @@ def main():
     print(tables, end="")
     if chosen.write:
         write_into_document(tables)
+        if f"### {picture.PAYLOAD}" in tables:
+            picture.main([])
 
 
 if __name__ == "__main__":

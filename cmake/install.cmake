@@ -33,7 +33,7 @@ install(FILES completions/orvpatch.fish
   DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d COMPONENT program)
 install(FILES README.md SECURITY.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT program OPTIONAL)
 install(DIRECTORY docs/ DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs COMPONENT program
-  FILES_MATCHING PATTERN "*.md" PATTERN release.md EXCLUDE)
+  FILES_MATCHING PATTERN "*.md" PATTERN "*.svg" PATTERN release.md EXCLUDE)
 
 install(FILES completions/_orvpatch
   DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions COMPONENT site)

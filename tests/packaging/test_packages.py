@@ -23,7 +23,7 @@ DEBIAN = {"share/zsh/vendor-completions/_orvpatch", "share/doc/orvpatch/changelo
 def documents():
     """README and the like, and docs but for what only those who release need."""
     top = [name for name in ("README.md", "SECURITY.md") if (CHECKOUT / name).exists()]
-    docs = [f"docs/{path.name}" for path in CHECKOUT.glob("docs/*.md") if path.name != "release.md"]
+    docs = [f"docs/{path.name}" for path in CHECKOUT.glob("docs/*.*") if path.name != "release.md"]
     return {f"share/doc/orvpatch/{name}" for name in top + docs}
 
 
