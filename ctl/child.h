@@ -1,0 +1,27 @@
+// Programs that this one runs: with an environment of its own making, their output kept whole.
+#pragma once
+
+#include <string>
+#include <vector>
+
+struct ChildResult {
+  int status =
+      0; ///< exit status; 128 and the number of the signal that ended it; 127 when it could not be started
+  std::string out;
+  std::string err;
+};
+
+/// What a child inherits: nothing of the caller's environment but these, and default dispositions of signals.
+struct ChildEnvironment {
+  std::string path;                   ///< PATH
+  std::vector<std::string> variables; ///< further ones, "NAME=value"
+};
+
+/// Runs words[0], an absolute path or a name looked up in the environment's PATH, with /dev/null as standard
+/// input, and waits for its end. Output goes to files in memory, so that no child waits for a reader.
+/// JudgementError when the system gives no process.
+ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironment &environment);
+
+/// The file that a name stands for in a search path: the first that can be executed; empty when there is
+/// none.
+std::string findProgram(const std::string &name, const std::string &path);
