@@ -67,8 +67,9 @@ def target_is_a_directory(site, patch):
 
 
 def directory_is_a_dangling_link(site, patch):
-    patch.file("new/file")
-    (site.home.path / "new").symlink_to("nowhere")
+    # Beside the other file: directories are walked before files, in whatever order they are listed.
+    patch.file("bin/new/file")
+    (site.home.mkdir("bin") / "new").symlink_to("nowhere")
 
 
 def version_file_is_removed(site, patch):
@@ -102,9 +103,9 @@ FAILURES = {
                               f"{site.home.prefix}./bin/tool"),
         target_is_a_directory, calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT], running="ox", result_file="25"),
     "5, a directory that cannot be made": Failure(
-        26, lambda site: text("ERROR_PP_MAKE_DIR", f"{site.home.prefix}./new/"),
+        26, lambda site: text("ERROR_PP_MAKE_DIR", f"{site.home.prefix}./bin/new/"),
         directory_is_a_dangling_link, calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT], running="ox",
-        result_file="26", left=("tmp/kyn/updated_files/new", "tmp/kyn/updated_files/new/file")),
+        result_file="26", left=("tmp/kyn/updated_files/bin/new", "tmp/kyn/updated_files/bin/new/file")),
     "7, post commands": Failure(
         23, text("PROC_BAD_RC", "3_moved.sh", 1), script("3_moved.sh", "post", status=1),
         calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT], running="ox", result_file="23", moved=True),

@@ -55,12 +55,12 @@ def test_a_whole_installation(program, product, folder):
     assert [line[:5] for line in product.history()] == [("k%n", "lpp%s", "vema", ODD, "PASS")]
     source = f"{product.prefix}tmp/k%n/updated_files"
     infos = product.log().messages("INFO")
-    assert infos[:5] == ["Processing 1 scripts.", f"Attempting to execute: {ODD}.sh", f"Successfully executed: {ODD}.sh",
-                         f"Will attempt to move files from {source} to {product.prefix}",
-                         f"Creating new directory: {product.prefix}./{ODD}/"]
-    assert sorted(infos[5:7]) == sorted([
-        f"Successfully moved file from {source}/./{ODD}/{ODD} to {product.prefix}./{ODD}/{ODD}",
-        f"Successfully moved file from {source}/./bin/{ODD} to {product.prefix}./bin/{ODD}"])
+    assert infos[:4] == ["Processing 1 scripts.", f"Attempting to execute: {ODD}.sh", f"Successfully executed: {ODD}.sh",
+                         f"Will attempt to move files from {source} to {product.prefix}"]
+    new = [f"Creating new directory: {product.prefix}./{ODD}/",
+           f"Successfully moved file from {source}/./{ODD}/{ODD} to {product.prefix}./{ODD}/{ODD}"]
+    old = [f"Successfully moved file from {source}/./bin/{ODD} to {product.prefix}./bin/{ODD}"]
+    assert infos[4:7] in (new + old, old + new)  # as the two directories happen to be listed
     traces = product.log().messages("TRACE", "patchprocessor")
     assert traces.count(f"stdOut: {ODD}") == traces.count(f"stdErr: {ODD}") == 1
 
