@@ -1,6 +1,9 @@
 """What a case works with: a product home, a folder of patches, the program, and the shapes of its output."""
 
 import os
+import signal
+import subprocess
+import time
 
 from support import Patch, Result
 
@@ -113,6 +116,38 @@ class Site:
         if os.geteuid() == 0:
             self.user = "nobody"
             self.home.give_to(self.user)
+
+
+_WAIT = 'touch "$QUILLHOME/waiting-{0}"; while [ ! -e "$QUILLHOME/go-{0}" ]; do sleep 0.02; done'
+
+
+class Running:
+    """An installation under way: a command of its patch waits until `finish` lets it go."""
+
+    def __init__(self, site, code, **fields):
+        self.home, self.code = site.home, code
+        patch = Patch(code, **fields).file(f"bin/{code}").script("a.sh", "pre", body=_WAIT.format(code))
+        command = [*site.program.argv, "-h", site.home, "-i", patch.write(site.patch_dir)]
+        self.process = subprocess.Popen(command, env={**os.environ, **site.env}, start_new_session=True,
+                                        stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+        limit = time.monotonic() + 30
+        while not site.home.exists(f"waiting-{code}"):
+            assert time.monotonic() < limit
+            time.sleep(0.01)
+
+    def finish(self):
+        self.home.write(f"go-{self.code}")
+        return self.process.wait(timeout=30)
+
+    def interrupt(self, sign=signal.SIGINT):
+        """Signals the program and its children, as a terminal does."""
+        os.killpg(self.process.pid, sign)
+        return self.process.wait(timeout=30)
+
+    def kill(self):
+        """Kills the program alone; its child lives on."""
+        self.process.kill()
+        return self.process.wait(timeout=30)
 
 
 def usage():

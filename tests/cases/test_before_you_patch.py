@@ -2,19 +2,13 @@
 
 import os
 import signal
-import subprocess
-import time
 
 import pytest
 
 from support import Patch, ProductHome, stubs
 
 from catalogue import text
-from productsite import Site
-
-
-def command_words(site):
-    return [message.split(": ", 1)[1] for message in site.logged("TRACE") if message.startswith("cmdArray[")]
+from productsite import Running, Site
 
 
 # --- the path of the home -----------------------------------------------------------------------------------
@@ -211,32 +205,6 @@ def test_a_user_who_may_run_the_program_as_root_is_root(site, scratch):
     assert site.run("-h", home, "-i", site.target(Patch("yn").file("bin/tool"))).status == 0
     assert home.read("who") == b"0\n"
     home.close()
-
-
-WAIT = 'touch "$QUILLHOME/waiting-{0}"; while [ ! -e "$QUILLHOME/go-{0}" ]; do sleep 0.02; done'
-
-
-class Running:
-    """An installation whose pre command waits until it is let go."""
-
-    def __init__(self, site, code, **fields):
-        self.home, self.code = site.home, code
-        patch = Patch(code, **fields).file(f"bin/{code}").script("a.sh", "pre", body=WAIT.format(code))
-        command = [*site.program.argv, "-h", site.home, "-i", patch.write(site.patch_dir)]
-        self.process = subprocess.Popen(command, env={**os.environ, **site.env}, start_new_session=True,
-                                        stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
-        limit = time.monotonic() + 30
-        while not site.home.exists(f"waiting-{code}"):
-            assert time.monotonic() < limit
-            time.sleep(0.01)
-
-    def finish(self):
-        self.home.write(f"go-{self.code}")
-        return self.process.wait(timeout=30)
-
-    def interrupt(self, sign):
-        os.killpg(self.process.pid, sign)
-        return self.process.wait(timeout=30)
 
 
 def test_of_two_runs_with_a_common_dependent_one_starts_it_while_the_other_patches(site):
