@@ -1,8 +1,7 @@
-"""Measures orvpatch beside the floor of its design and beside the packagers that users know.
+"""Measures orvpatch beside the floor of its design and beside common packagers.
 
 Every payload is installed by all contenders in turn, in several rounds, each time into a fresh copy of the same
-home in memory. The tables come on standard output, as docs/performance.md holds them; what is being done, on
-standard error.
+home in memory. The tables go to standard output, as in docs/performance.md, and progress to standard error.
 """
 
 import argparse
@@ -54,7 +53,7 @@ def chosen_payloads(chosen):
 
 
 def conditions(file_system, bench, rounds):
-    """What the figures depend on, as the first table."""
+    """The conditions of the measurement, as the first table."""
     model = next((line.split(":")[1].strip() for line in Path("/proc/cpuinfo").read_text().splitlines()
                   if line.startswith(("model name", "cpu\t"))), platform.machine())
     rows = [("date", f"{datetime.date.today()}"), ("processor", f"{os.cpu_count()} x {model}"),

@@ -1,4 +1,4 @@
-"""Who installs a payload: the tool, the floor of its design, and the packagers that users know."""
+"""The contenders: the tool, the floor of its design, and common packagers."""
 
 import os
 import shutil
@@ -26,8 +26,8 @@ cp -a {tree}/. %{{buildroot}}
 
 @dataclass(frozen=True)
 class Peer:
-    """A program beside the tool. `build` makes its package of one tree and gives its path back, `command` the
-    words that install a list of them into a home, `prepare` what it needs in a fresh home."""
+    """A program beside the tool. `build` makes its package of one tree and returns its path, `command` returns the
+    words that install a list of packages into a home, `prepare` makes what it needs in a fresh home."""
 
     name: str
     program: str
@@ -37,7 +37,7 @@ class Peer:
     needs_root: bool = False
 
     def obstacle(self):
-        """Why it cannot take part here; empty when it can."""
+        """The reason why it cannot take part here; empty when it can."""
         if shutil.which(self.program) is None:
             return f"{self.program} is not installed"
         return "needs root" if self.needs_root and os.geteuid() != 0 else ""
@@ -62,7 +62,7 @@ def _deb_package(tree, folder):
     control = tree / "DEBIAN"
     control.mkdir()
     (control / "control").write_text(_CONTROL.format(name=f"payload{tree.name}"))
-    # Not compressed, like the patch files: what is compared is the installing, not the unpacking of xz.
+    # Not compressed, like the patch files: the comparison is of installing, not of unpacking xz.
     subprocess.run(["dpkg-deb", "-Znone", "--build", tree, package], check=True, stdout=subprocess.DEVNULL)
     shutil.rmtree(control)
     return package
@@ -77,7 +77,7 @@ def _prepare_dpkg(home):
 
 
 def _dpkg(option):
-    # The option is always given: the machine's own configuration may hold its contrary.
+    # The option is always given: the machine's configuration may set the opposite.
     return lambda home, packages: ["dpkg", option, f"--root={home}", f"--log={home}/var/lib/dpkg/log", "-i", *packages]
 
 

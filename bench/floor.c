@@ -1,4 +1,4 @@
-// The floor under an installation: the work that its design asks for, and nothing else.
+// The floor under an installation: the work that its design requires, and nothing else.
 //
 //   floor install|install-at|report HOME VERSION-FILE FILES LINES BYTES ARCHIVE...
 //
@@ -9,12 +9,12 @@
 // nothing. Spread over the FILES files, LINES log lines of BYTES bytes in all are written, each by one open,
 // one write and one close.
 //
-// install-at keeps the home and the log's directory open and names files from there, which spares the system
-// the way down to them. The design does not do so: another process may put a new directory in the place of
-// one that is kept open. It shows what that costs.
+// install-at uses names relative to the open home and log directory, which saves the system the look-up of
+// the full path. The design does not do so: another process may replace a directory that is kept open. The
+// difference is the price.
 //
-// No message is put together, no failure is survived, entries are taken in the order of the system: whatever
-// a program does above this is its own. HOME ends in "/"; all paths are absolute.
+// No message is formatted, each failure ends the program, entries are in the order of the system: all other
+// work of a program is its own. HOME ends in "/"; all paths are absolute.
 #define _GNU_SOURCE
 #include <dirent.h>
 #include <fcntl.h>
@@ -26,12 +26,12 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-// A path below the home, and its tail below the working directory: "/opt/orv/./bin/tool", "./bin/tool". The
-// two names of a file that moves are thus made at once, by one copy of its last component.
+// A path below the home, and its tail below the working directory: "/opt/orv/./bin/tool", "./bin/tool". One
+// copy of the last component makes both names of a file.
 static char path[PATH_MAX];
 static char *below;
 
-// The place under the home of the file that moves, and the log: what to start from, and the name from there.
+// The place of a file under the home, and the log: the directory to start from, and the name from there.
 static int homeDirectory = AT_FDCWD, logDirectory = AT_FDCWD;
 static const char *target = path, *logName;
 
@@ -74,7 +74,7 @@ static void writeTo(int directory, const char *file, int flags, const char *text
   close(descriptor);
 }
 
-// The share of one file in the log lines that are left, each of the mean length of those.
+// The share of one file in the remaining log lines, each of their mean length.
 static void writeLines(void) {
   static char text[65536];
   for (size_t share = linesLeft / filesLeft--; share > 0; --share) {
@@ -97,7 +97,7 @@ static void extract(const char *archive, const char *member) {
   check(waitpid(child, &status, 0) == child && status == 0, archive);
 }
 
-// What is done with a directory before its entries, with each file, with a directory after its entries.
+// Actions for a directory before its entries, for each file, for a directory after its entries.
 struct visitor {
   void (*enter)(void);
   void (*file)(void);

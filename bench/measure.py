@@ -1,4 +1,4 @@
-"""Runs one command and tells what it cost."""
+"""Runs one command and measures its cost."""
 
 import subprocess
 from pathlib import Path
@@ -23,7 +23,7 @@ class Meter:
         self._usage = self.build("usage")
 
     def build(self, name):
-        """Builds bench/NAME.c; the path of the program."""
+        """Builds bench/NAME.c and returns the path of the program."""
         program = self._folder / name
         subprocess.run(["cc", "-std=c11", "-O2", "-o", program, SOURCES / f"{name}.c"], check=True)
         return program

@@ -1,4 +1,4 @@
-"""A folder in memory to measure in, so that no disk has a part in the figures."""
+"""A folder in memory to measure in, so that no disk affects the figures."""
 
 import contextlib
 import os
@@ -35,7 +35,7 @@ def _mount_image(stack, mebibytes):
     image = memory / "image"
     with image.open("wb") as file:
         file.truncate(mebibytes << 20)
-    # Nothing is left to be initialised by the kernel while the figures are taken.
+    # The kernel has nothing left to initialise during the measurement.
     _run("mkfs.ext4", "-q", "-F", "-i", "8192", "-E", "lazy_itable_init=0,lazy_journal_init=0", image)
     _mount(stack, folder, "-o", "loop", image)
     return folder

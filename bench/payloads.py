@@ -1,4 +1,4 @@
-"""What is installed: the payloads, and how one is laid out on disk in the form that each contender takes."""
+"""The payloads, and the form in which each contender takes them from disk."""
 
 import random
 import shutil
@@ -15,8 +15,8 @@ MEBIBYTE = (1 << 20, 1 << 20)
 
 @dataclass(frozen=True)
 class Payload:
-    """`files` new files, 20 to a directory, in `patches` patches; the share `existing` of them is in the home
-    already, with other content. `peers` says whether the peers install it too."""
+    """`files` new files, 20 to a directory, in `patches` patches; the share `existing` of them is already in the
+    home, with other content. `peers`: whether the peers install it too."""
 
     key: str
     title: str
@@ -28,12 +28,12 @@ class Payload:
     peers: bool = True
 
     def tiny(self):
-        """The same in the smallest shape that still has everything: to see that it runs."""
+        """The same in the smallest shape that still has everything, to test that it runs."""
         return replace(self, title=f"40 files in the place of: {self.title}", files=40, sizes=SMALL,
                        patches=min(self.patches, 2))
 
     def codes(self):
-        """The product code of each patch: one patch for each of so many products."""
+        """The product code of each patch; each patch is for another product."""
         return ["ox"] if self.patches == 1 else [f"{chr(97 + n // 10)}{n % 10}" for n in range(self.patches)]
 
 
@@ -70,7 +70,7 @@ class Laid:
 
     @property
     def path(self):
-        """What the tool is given: the patch file, or the directory when there are several."""
+        """The tool's argument: the patch file, or the directory of several."""
         return self.patches[0] if len(self.patches) == 1 else self.patches[0].parent
 
     @property
@@ -78,7 +78,7 @@ class Laid:
         return self.home / f"registry/{self.payload.codes()[0]}lpp266.ver"
 
     def packages(self, build):
-        """What `build` makes of each tree; made once for all peers that take the same kind."""
+        """The packages that `build` makes of the trees, made once for all peers of the same kind."""
         if build not in self._packages:
             folder = self.folder / "packages"
             folder.mkdir(exist_ok=True)
@@ -86,13 +86,13 @@ class Laid:
         return self._packages[build]
 
     def log_size(self):
-        """Lines and bytes of the log that the last run has left."""
+        """Lines and bytes of the log of the last run."""
         home = ProductHome.attach(self.home)
         log = home.log()
         return len(log.headers) + len(log.lines), len(home.read("patchlogs/orvpatch.log"))
 
     def refresh(self):
-        """Makes the home anew, and has nothing left to write before the run that follows."""
+        """Makes the home anew, and waits until everything is on disk."""
         shutil.rmtree(self.home, ignore_errors=True)
         subprocess.run(["cp", "-a", self.template, self.home], check=True)
         subprocess.run(["sync", "-f", self.home], check=True)

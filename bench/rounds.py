@@ -1,4 +1,4 @@
-"""One payload: everybody installs it, once to show that they do it right, then in rounds."""
+"""One payload: each contender installs it, once to check the result, then in rounds."""
 
 import os
 from dataclasses import dataclass, field
@@ -9,14 +9,14 @@ from payloads import Laid
 
 @dataclass
 class Trial:
-    """What one payload has cost everybody who took part."""
+    """The costs of one payload for each contender."""
 
     payload: object
     log_lines: int = 0
     log_bytes: int = 0
     costs: dict = field(default_factory=dict)         # contender -> its Cost in each round
     system_calls: dict = field(default_factory=dict)  # the tool and the floor -> system call -> number
-    absent: dict = field(default_factory=dict)        # peer -> why it did not take part
+    absent: dict = field(default_factory=dict)        # peer -> reason for its absence
 
 
 class Bench:
@@ -26,7 +26,7 @@ class Bench:
         self.loads = []  # the machine's load before each run
 
     def trial(self, payload, rounds, progress):
-        """Lays the payload out, measures everybody on it `rounds` times, and removes it again."""
+        """Makes the payload, measures each contender on it `rounds` times, and removes it."""
         trial = Trial(payload)
         laid = Laid(payload, self._folder)
         commands = self._commands(laid, trial)
@@ -52,7 +52,7 @@ class Bench:
         return {TOOL: tool, **self._floor_commands(laid, trial), **peers}
 
     def _floor_commands(self, laid, trial):
-        # As many log lines as the tool has just written, and as many bytes in them.
+        # The number and total size of the log lines that the tool has just written.
         words = [f"{laid.home}/", laid.version_file, trial.payload.files, trial.log_lines, trial.log_bytes,
                  *laid.patches]
         actions = {FLOOR: "install", FLOOR_AT: "install-at"} if trial.payload.action == "-i" else {FLOOR: "report"}
@@ -77,6 +77,6 @@ class Bench:
 
 
 def _rotated(names, by):
-    """Another one begins each round, so that nobody always runs behind the same neighbour."""
+    """The order rotates by one each round, so that none always follows the same contender."""
     by %= len(names)
     return names[by:] + names[:by]

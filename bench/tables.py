@@ -13,7 +13,7 @@ def median(trial, name, quantity):
 
 
 def ratio(trial, name, other, quantity):
-    """Median of the rounds' ratios: what disturbs the machine for a while disturbs both runs of a round."""
+    """Median of the rounds' ratios: other load disturbs both runs of a round alike."""
     pairs = zip(trial.costs[name], trial.costs[other])
     return statistics.median(getattr(one, quantity) / getattr(two, quantity) for one, two in pairs)
 
@@ -66,7 +66,7 @@ class Goal(NamedTuple):
 
 
 def goals(trials):
-    """Those of the goals for which the trials give a figure; trials by the key of their payload."""
+    """The goals for which the trials have a figure; trials by the key of their payload."""
     found = [Goal(f"CPU, times the floor's, on ({key})", limit, ratio(trials[key], TOOL, FLOOR, "cpu"))
              for key, limit in zip("abcde", (1.10, 1.05, 1.10, 1.10, 1.10)) if key in trials]
     found += [Goal(f"own system calls for each file on ({key})", limit, calls_per_file(trials[key], TOOL))

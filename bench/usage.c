@@ -1,10 +1,9 @@
-// Runs a command and writes what it used to the file named first: wall seconds, user and system CPU seconds
-// of it and of the children that it waited for, and its peak memory in KiB. Ends with the command's
-// exit status.
+// Runs a command and writes its costs to the file named first: wall seconds, user and system CPU seconds of
+// it and of the children that it waited for, and its peak memory in KiB. Ends with the command's exit status.
 //
 //   usage RESULT-FILE COMMAND...
 //
-// A program of its own because the kernel counts the memory that a process had before it executed the
+// It is a separate program because the kernel counts the memory that a process had before it executed the
 // command: started by an interpreter, every command would seem to need the interpreter's memory.
 #define _GNU_SOURCE
 #include <stdio.h>
