@@ -184,10 +184,6 @@ bool DCFPackageProcessor::loadPatch(const std::string &home, const File &file, P
   const std::string path = file.getPath();
   LOG_TRACE("[%s] is applicable.", path.c_str());
   std::unique_ptr<PatchProcessor> processor(PatchProcessor::createProcessor(path, home, error));
-  if (processor == nullptr) {
-    LOG_TRACE("Error loading patch: %s", path.c_str());
-    return false;
-  }
   LOG_TRACE("Calling initialize ");
   if (!processor->initialize(error)) {
     LOG_TRACE("Error initializing patch: %s", path.c_str());

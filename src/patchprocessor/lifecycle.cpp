@@ -180,8 +180,6 @@ void patchProcessorSelfCheck() {
   PatchError error;
   const std::unique_ptr<PatchProcessor> processor(
       PatchProcessor::createProcessor(samplePatch, Util::getQuillHome(), &error));
-  if (processor == nullptr)
-    fprintf(stderr, "Can't create patch processor, Error: %s\n", error.text.c_str());
-  else if (!processor->initialize(&error))
+  if (!processor->initialize(&error))
     fprintf(stderr, "Can't initialize patch processor, Error: %s\n", error.text.c_str());
 }

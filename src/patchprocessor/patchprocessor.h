@@ -111,7 +111,6 @@ private:
   bool verifyLevel(const ORVComponent &installed, PatchError *err);
   bool verifyPrereq(const std::string &prereq, const ORVComponent &installed, PatchError *err);
   bool hasDependents() const;
-  std::vector<std::string> dependentCodes() const;
   void collectAll();
   void collectListed(const std::vector<std::string> &codes);
   bool stopAll(PatchError *err);
