@@ -21,9 +21,8 @@
 
 namespace {
 
-/// Statuses of the driver's own. The last one is far from the codes of the operations: it says nothing about
-/// the patch, only that the system gave no more memory.
-enum ExitStatus { UsageError = 1, BadHome = 2, OutOfMemory = 71 };
+/// Statuses of the driver's own.
+enum ExitStatus { UsageError = 1, BadHome = 2 };
 
 struct Arguments {
   std::string home;
@@ -155,21 +154,13 @@ int reportVerdict(int status) {
   return status;
 }
 
-/// Ends the process where it is, as a kill would, but with a message. Nothing that needs memory may be
-/// called.
-[[noreturn]] void endWithoutMemory() {
-  static const char message[] = "orvpatch: out of memory\n";
-  static_cast<void>(!write(STDERR_FILENO, message, sizeof message - 1));
-  _exit(OutOfMemory);
-}
-
 /// What a caller may have left in a state that this process must not work in: an ignored SIGCHLD would take
 /// away the children's exit statuses, and a closed standard descriptor would be given to the next file that
 /// is opened. And a reader that goes away, or a limit on the size of files, must not end an installation in
 /// its middle.
 void repairInheritedState() {
   static_cast<void>(signal(SIGCHLD, SIG_DFL));
-  setWriteSignals(SIG_IGN);
+  ignoreWriteSignals();
   int fd = 0;
   do
     fd = open("/dev/null", O_RDWR);
@@ -181,7 +172,7 @@ void repairInheritedState() {
 } // namespace
 
 int main(int argc, char **argv) {
-  std::set_new_handler(endWithoutMemory);
+  std::set_new_handler(Util::endWithoutMemory);
   repairInheritedState();
   const bool selfCheck = argc == 4 && std::string(argv[3]) == "-utest";
   Arguments arguments;

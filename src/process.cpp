@@ -40,16 +40,32 @@ struct Pipes {
   }
 };
 
+/// What a child may say before it is waited for: with this size, which the system gives to root, a tar that
+/// warns of every member of a large archive still ends. An ordinary user is mostly given 1 MiB.
+constexpr int LargestPipe = 16 * 1024 * 1024;
+/// The size of a new pipe, with pages of 4 KiB.
+constexpr int UsualPipe = 64 * 1024;
+
+/// Lets a pipe hold as much as the system gives. A refusal leaves it as it was.
+void enlarge(int end) {
+  for (int size = LargestPipe; size > UsualPipe && fcntl(end, F_SETPIPE_SZ, size) < 0; size /= 2) {
+  }
+}
+
 /// False, with both ends -1 and the reason in errno, when there is no pipe to be had.
 bool makePipe(int *ends) {
   ends[ReadEnd] = ends[WriteEnd] = -1;
   if (pipe(ends) != 0)
     return false;
+  enlarge(ends[WriteEnd]);
   // The child has ended before its output is read, so all of it is in the pipe. A program that it left behind
   // may still hold the other end: an empty pipe then means no output, and is not to be waited on.
   static_cast<void>(fcntl(ends[ReadEnd], F_SETFL, O_NONBLOCK));
   return true;
 }
+
+/// What whoever started this process wants to become of SIGPIPE.
+void (*callersPipeSignal)(int) = SIG_DFL;
 
 [[noreturn]] void runChild(char **argv, Pipes &pipes) {
   pipes.closeEnd(ReadEnd);
@@ -57,20 +73,26 @@ bool makePipe(int *ends) {
     LOG_ERROR("Error duping STDOUT");
   if (dup2(pipes.err[WriteEnd], STDERR_FILENO) < 0)
     LOG_ERROR("Error duping STDERR");
-  setWriteSignals(SIG_DFL);
+  static_cast<void>(signal(SIGPIPE, callersPipeSignal));
   execvp(argv[0], argv); // NOLINT(clang-analyzer-core.NonNullParamChecker): the vector names its program
   const int error = errno;
   LOG_ERROR("error calling execvp = %d: %s", error, strerror(error));
   exit(error);
 }
 
-/// Waits for the one child; false when the system does not tell of any.
-bool waitForChild(int *status) {
-  pid_t child = 0;
+/// Waits for the end of this child; false, with a line in the log, when the system does not tell of it. A
+/// shell that has replaced itself by this program leaves it its own children: their ends are taken and
+/// forgotten.
+bool waitFor(pid_t child, int *status) {
+  pid_t ended = 0;
   do
-    child = wait(status);
-  while (child < 0 && errno == EINTR);
-  return child >= 0;
+    ended = wait(status);
+  while (ended != child && (ended >= 0 || errno == EINTR));
+  if (ended == child)
+    return true;
+  const int error = errno;
+  LOG_ERROR("Error waiting for process %d: %s", static_cast<int>(child), strerror(error));
+  return false;
 }
 
 /// One read of at most 4096 bytes, up to the first NUL among them; the rest of a longer output is dropped.
@@ -92,9 +114,11 @@ void deliver(const std::string &output, std::string *destination, FILE *stream) 
 
 } // namespace
 
-void setWriteSignals(void (*disposition)(int)) {
-  for (const int number : {SIGPIPE, SIGXFSZ})
-    static_cast<void>(signal(number, disposition));
+void ignoreWriteSignals() {
+  const auto before = signal(SIGPIPE, SIG_IGN);
+  if (before != SIG_ERR)
+    callersPipeSignal = before;
+  static_cast<void>(signal(SIGXFSZ, SIG_IGN));
 }
 
 bool createPipes(int *outPipe, int *errPipe) {
@@ -125,10 +149,10 @@ bool runCommand(char **argv, int *rc, std::string *out, std::string *err) {
     runChild(argv, pipes);
 
   pipes.closeEnd(WriteEnd);
-  // KEEP(wait-before-read): the end comes before the reading, so a child that writes more than a pipe holds
-  // waits for ever. Commands of a patch are expected to be silent.
+  // KEEP(wait-before-read): the end comes before the reading, so a child that writes more than a pipe holds,
+  // here up to 16 MiB, waits for ever. Commands of a patch are expected to be silent.
   int status = 0;
-  if (!waitForChild(&status))
+  if (!waitFor(child, &status))
     return false;
   deliver(readOnce(pipes.out[ReadEnd]), out, stdout);
   deliver(readOnce(pipes.err[ReadEnd]), err, stderr);

@@ -1,7 +1,8 @@
 // Child processes: one program at a time, without a shell, its output captured.
 //
 // The child is waited for before its output is read, and only the first 4096 bytes of each stream are kept.
-// A program whose output does not fit in a pipe (64 KiB on Linux) therefore never ends, nor does the tool.
+// A program whose output does not fit in a pipe therefore never ends, nor does the tool. The pipes are as
+// large as the system gives: 16 MiB for root, mostly 1 MiB for an ordinary user.
 #pragma once
 
 #include <string>
@@ -27,9 +28,11 @@ struct CommandResult {
 /// The same for a command given as its words, with both streams captured.
 bool runCommand(const std::vector<std::string> &words, CommandResult &result);
 
-/// Sets the disposition of the signals that a write may raise: SIG_IGN for the tool, so that a log that
-/// nobody takes ends no run; children get SIG_DFL.
-void setWriteSignals(void (*disposition)(int));
+/// Ignores the signals that a write may raise, for a log that nobody takes ends no run. Children get SIGPIPE
+/// as the caller of this process has it. SIGXFSZ stays ignored for them: a child that reaches the limit on
+/// the size of files can then end with a status of its own, where one that a signal ends would count as a
+/// success.
+void ignoreWriteSignals();
 
 /// Makes the two pipes, read end first. A pipe that cannot be made is logged and its ends are -1; the result
 /// is true all the same.

@@ -40,7 +40,8 @@ ssize_t readUpTo(const FileDescriptor &file, char *buffer, std::size_t size) {
 /// The whole content of an open file as a new NUL-terminated buffer; 0 or an error number.
 int readContent(const FileDescriptor &file, const char *name, char **buffer) {
   const off_t size = lseek(file.get(), 0, SEEK_END);
-  // The limit of a 32-bit size: nothing that the product reads whole comes near it.
+  // KEEP(size-limit): a file from the limit of a 32-bit size on is refused; nothing that the product reads
+  // whole comes near it.
   if (size < 0 || size >= INT_MAX || lseek(file.get(), 0, SEEK_SET) != 0)
     return EINVAL;
   const auto capacity = static_cast<std::size_t>(size);
@@ -73,8 +74,10 @@ int readRegularFile(const char *name, char **buffer) {
     return EINVAL;
   }
   // A pipe or device has no size to seek to, and opening one may wait for ever.
-  if (!S_ISREG(status.st_mode))
+  if (!S_ISREG(status.st_mode)) {
+    LOG_TRACE("Special file specified instead of a file: %s", name);
     return EINVAL;
+  }
   const FileDescriptor file(name, O_RDONLY);
   if (!file.isOpen()) {
     LOG_ERROR("unable to open file: %s", name);
@@ -198,7 +201,16 @@ void Util::setEnvironment(const std::string &name, const std::string &value) {
   // released; kept here, those that a later one has replaced stay reachable for whoever looks for leaks.
   static auto *const strings = new std::deque<std::string>;
   strings->push_back(name + "=" + value);
-  static_cast<void>(putenv(strings->back().data()));
+  // Its only failure is want of memory, and with the old home or search path the wrong files would be used.
+  if (putenv(strings->back().data()) != 0)
+    endWithoutMemory();
+}
+
+void Util::endWithoutMemory() {
+  static constexpr int OutOfMemory = 71;
+  static constexpr char message[] = "orvpatch: out of memory\n";
+  static_cast<void>(!write(STDERR_FILENO, message, sizeof message - 1));
+  _exit(OutOfMemory);
 }
 
 bool Util::isVEMSInstalled() {

@@ -42,8 +42,13 @@ public:
   /// when it is empty. LF and CR LF end a line. Returns 0, or readFile's error number and no lines.
   static int readFileByLines(const char *name, std::vector<std::string> &lines);
 
-  /// Puts name=value into the environment of this process and of its children.
+  /// Puts name=value into the environment of this process and of its children; ends the process as
+  /// endWithoutMemory does when there is no room for it.
   static void setEnvironment(const std::string &name, const std::string &value);
+
+  /// Ends the process where it is, as a kill would, but with a message and a status of its own, which is far
+  /// from the codes of the operations: it says nothing about the patch. Needs no memory itself.
+  [[noreturn]] static void endWithoutMemory();
 
   static bool isVEMSInstalled();                 ///< monitoring server
   static bool isVEPSInstalled(std::string arch); ///< portal server

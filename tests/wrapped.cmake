@@ -7,6 +7,7 @@ set(wrapped_calls
   close
   dup2
   execvp
+  fcntl
   fork
   fsync
   getcwd
@@ -21,6 +22,7 @@ set(wrapped_calls
   open
   opendir
   pipe
+  putenv
   read
   readdir
   rmdir

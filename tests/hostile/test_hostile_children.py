@@ -1,11 +1,14 @@
-"""Child processes that print too much, print NULs, die, or leave somebody behind."""
+"""Child processes that print too much, print NULs, die, leave a process behind, or are not the tool's own."""
 
+import fcntl
 import os
 import signal
+import subprocess
 import time
 
 import pytest
 
+from rawarchive import RawArchive
 from support import Patch, stubs
 from verdicts import INSTALLED, refused
 
@@ -160,3 +163,96 @@ def test_a_command_ends_the_tool_but_not_the_history(run_script, product):
     assert product.history() == []
     assert product.read("bin/tool") == b"new\n"
     assert product.level("ox") == "06100000"
+
+
+LARGEST_PIPE = 16 * 1024 * 1024
+
+
+def pipe_of_the_own_user():
+    """How many bytes a child may say: what the system gives to whoever runs the tests."""
+    ends = os.pipe()
+    try:
+        fcntl.fcntl(ends[0], fcntl.F_SETPIPE_SZ, LARGEST_PIPE)
+    except PermissionError:
+        pass
+    size = fcntl.fcntl(ends[0], fcntl.F_GETPIPE_SZ)
+    for end in ends:
+        os.close(end)
+    return size
+
+
+def archive_of_the_future(folder, members):
+    """tar(1) has a line for every member of it, of some 90 bytes."""
+    archive, hour_ahead = RawArchive(Patch("ox")), time.time() + 3600
+    for number in range(members):
+        archive.file(f"updated_files/bin/{number}", b"", mtime=hour_ahead)
+    return archive.write(folder)
+
+
+def installed(product):
+    return len(list((product.path / "bin").glob("[0-9]*")))
+
+
+def test_a_tar_that_warns_of_20_000_members_ends(program, product, patch_dir):
+    if pipe_of_the_own_user() < LARGEST_PIPE:
+        pytest.skip("needs pipes of 16 MiB: run it as root, with CAP_SYS_RESOURCE")
+    assert program.install(product, archive_of_the_future(patch_dir, 20000)) == INSTALLED
+    assert installed(product) == 20000
+
+
+def test_a_tar_that_warns_within_a_mebibyte_ends_for_an_ordinary_user(program, product, patch_dir):
+    user = "nobody" if os.geteuid() == 0 else None
+    if user:
+        product.give_to(user)
+    assert program.install(product, archive_of_the_future(patch_dir, 8000), user=user) == INSTALLED
+    assert installed(product) == 8000
+
+
+def test_a_process_whose_command_line_repeats_an_agents_id_hangs_nothing(program, product, patch_dir):
+    product.start("ox")
+    pid = str(product.pid("ox"))
+    named = " ".join([pid] * (110000 // (len(pid) + 1)))
+    talker = subprocess.Popen(["/bin/sh", "-c", "sleep 300; :", named], start_new_session=True)
+    try:
+        assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir)) == INSTALLED
+    finally:
+        os.killpg(talker.pid, signal.SIGKILL)
+        talker.wait()
+    assert product.calls() == ["QuillAgent stop ox", "QuillAgent start ox"]
+
+
+def left_by_the_caller(line):
+    """The tool takes the place of a shell that has started this in the background: its child now."""
+    return ["/bin/sh", "-c", f'({line}) & exec "$@"', "sh"]
+
+
+@pytest.mark.parametrize("status", [0, 1])
+def test_a_child_of_the_caller_is_not_taken_for_a_command(program, product, patch_dir, status):
+    archive = Patch("ox").file("bin/tool").script(
+        "work.sh", "pre", body='>"$QUILLHOME/tmp/go"; sleep 1', status=7).write(patch_dir)
+    other = f"until [ -e '{product.path}/tmp/go' ]; do sleep 0.05; done; exit {status}"
+    result = program.install(product, archive, wrapper=left_by_the_caller(other))
+    assert result == refused(product, 21, "Bad return code from work.sh: 7")
+    assert not product.exists("bin/tool")
+
+
+def test_children_of_the_caller_that_end_at_any_time_cut_nothing_short(program, product, patch_dir):
+    archive = RawArchive(Patch("ox"))
+    for number in range(4000):
+        archive.file(f"updated_files/bin/{number}")
+    many = left_by_the_caller("for i in 0 1 2 3; do for j in 0 2 4 6 8; do sleep 0.$i$j & done; done; wait")
+    direct = ["/bin/sh", "-c", "".join(f"sleep 0.{n:02} & " for n in range(0, 60, 3)) + 'exec "$@"', "sh"]
+    assert program.install(product, archive.write(patch_dir), wrapper=[*many, *direct]) == INSTALLED
+    assert installed(product) == 4000
+
+
+@pytest.mark.needs_root
+def test_what_is_left_to_the_first_process_of_a_container_is_not_taken_for_a_command(program, product, patch_dir):
+    container = ["unshare", "--pid", "--fork", "--kill-child"]
+    if subprocess.run([*container, "true"], capture_output=True, check=False).returncode != 0:
+        pytest.skip("needs a system that lets root make process namespaces")
+    archive = Patch("ox").file("bin/tool").script("1.sh", "pre", body="(sleep 0.5) >/dev/null 2>&1 &").script(
+        "2.sh", "pre", body="sleep 1.5", status=7).write(patch_dir)
+    result = program.install(product, archive, wrapper=container)
+    assert result == refused(product, 21, "Bad return code from 2.sh: 7")
+    assert not product.exists("bin/tool")

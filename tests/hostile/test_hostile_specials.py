@@ -42,6 +42,7 @@ def test_as_a_descriptor_it_cannot_be_read(program, product, scratch, kind):
     path = scratch / "patch.ini"
     SPECIALS[kind](path)
     assert program.validate(product, path) == refused(product, 5, f"Unable to read file [{path}]: Invalid argument")
+    assert product.log().messages("TRACE", "utilities.cpp")[2] == f"Special file specified instead of a file: {path}"
 
 
 @special

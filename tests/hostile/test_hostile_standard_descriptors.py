@@ -9,7 +9,7 @@ import pytest
 
 from rawarchive import RawArchive
 from support import Patch
-from verdicts import INSTALLED, SUCCESS, failure
+from verdicts import INSTALLED, SUCCESS, failure, refused
 
 ALL_COMBINATIONS = [closed for count in range(4) for closed in itertools.combinations((0, 1, 2), count)]
 combination = pytest.mark.parametrize("closed", ALL_COMBINATIONS, ids=lambda closed: f"closed{closed}")
@@ -87,11 +87,16 @@ def test_a_reader_that_has_gone_stops_nothing(program, product, patch, stream, e
     assert [line.result for line in product.history()] == ["PASS"]
 
 
-def test_a_command_of_a_patch_is_told_of_a_reader_that_has_gone(program, product, patch_dir):
+@pytest.mark.parametrize("wrapper, status", [
+    ((), b"141\n"),  # 128 + SIGPIPE: not ignored
+    (("/bin/sh", "-c", 'trap "" PIPE; exec "$@"', "sh"), b"1\n")],  # it reads of the error instead
+    ids=["default", "ignored"])
+def test_a_command_of_a_patch_is_told_of_a_reader_that_has_gone_as_the_caller_would_be(
+        program, product, patch_dir, wrapper, status):
     archive = Patch("ox").file("bin/tool").script(
-        "look.sh", "post", body='(yes; echo $? >"$QUILLHOME/status") | head -1').write(patch_dir)
-    assert program.install(product, archive) == INSTALLED
-    assert product.read("status") == b"141\n"  # 128 + SIGPIPE: not ignored
+        "look.sh", "post", body='(yes 2>/dev/null; echo $? >"$QUILLHOME/status") | head -1').write(patch_dir)
+    assert program.install(product, archive, wrapper=wrapper) == INSTALLED
+    assert product.read("status") == status
 
 
 @pytest.mark.parametrize("stream", ["stdout", "stderr"])
@@ -113,6 +118,15 @@ def test_a_limit_on_the_size_of_files_costs_the_log_only(program, product, patch
     assert product.read("bin/tool") == b"new\n"
     assert product.read("patchlogs/orvpatch.log") == b"x" * 100000
     assert [line.result for line in product.history()] == ["PASS"]
+
+
+def test_an_archive_beyond_the_limit_on_the_size_of_files_installs_nothing(program, product, patch_dir):
+    archive = Patch("ox").file("bin/a").file("bin/large", b"x" * 200000).file("bin/z").write(patch_dir)
+    result = program.install(product, archive, wrapper=["prlimit", "--fsize=100000"])
+    assert result == refused(product, 3, "Bad return code from tar -xf: 2")
+    assert not product.exists("bin/a") and not product.exists("bin/z")
+    assert product.level("ox") == "06100000"
+    assert [line.result for line in product.history()] == ["FAIL"]
 
 
 def test_many_inherited_descriptors_are_left_alone(program, product, patch):

@@ -110,6 +110,7 @@ extern "C" {
 // The linker gives the calls of the program to __wrap_NAME, and the system's function to __real_NAME.
 pid_t __real_fork();
 int __real_pipe(int *ends);
+int __real_fcntl(int descriptor, int command, ...);
 int __real_dup2(int from, int to);
 pid_t __real_wait(int *status);
 int __real_execvp(const char *program, char *const *argv);
@@ -131,6 +132,7 @@ DIR *__real_opendir(const char *path);
 dirent *__real_readdir(DIR *directory);
 char *__real_getcwd(char *buffer, size_t size);
 int __real_chdir(const char *path);
+int __real_putenv(char *variable);
 uid_t __real_getuid();
 passwd *__real_getpwuid(uid_t user);
 int __real_uname(utsname *host);
@@ -144,6 +146,15 @@ pid_t __wrap_fork() {
 
 int __wrap_pipe(int *ends) {
   return fails("pipe") ? -1 : __real_pipe(ends);
+}
+
+// The commands that the program gives take a number or nothing.
+int __wrap_fcntl(int descriptor, int command, ...) {
+  va_list arguments;
+  va_start(arguments, command);
+  const long value = va_arg(arguments, long);
+  va_end(arguments);
+  return fails("fcntl", std::to_string(command)) ? -1 : __real_fcntl(descriptor, command, value);
 }
 
 int __wrap_dup2(int from, int to) {
@@ -243,6 +254,10 @@ char *__wrap_getcwd(char *buffer, size_t size) {
 
 int __wrap_chdir(const char *path) {
   return fails("chdir", path) ? -1 : __real_chdir(path);
+}
+
+int __wrap_putenv(char *variable) {
+  return fails("putenv", variable) ? -1 : __real_putenv(variable);
 }
 
 uid_t __wrap_getuid() {

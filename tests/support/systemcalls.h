@@ -15,7 +15,8 @@ class PlannedFailure {
 public:
   PlannedFailure(std::string call, int errorNumber) : call_(std::move(call)), errorNumber_(errorNumber) {}
 
-  /// Only for this object of the call: its (first) path, the user id, or the descriptor that dup2 replaces.
+  /// Only for this object of the call: its (first) path, the user id, the descriptor that dup2 replaces, or
+  /// the command of fcntl.
   PlannedFailure &on(std::string object) {
     object_ = std::move(object);
     return *this;

@@ -1,16 +1,19 @@
 // Child processes, with real ones: what is captured, what is handed back, what a child inherits.
 #include "process.h"
 
+#include <algorithm>
 #include <csignal>
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <sstream>
 #include <string>
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/wait.h>
 #include <unistd.h>
 
 #include "command.h"
@@ -284,25 +287,61 @@ TEST_F(ProcessTest, ProcessLeftBehindBySilentProgramIsNotWaitedFor) {
   EXPECT_EQ(result.out + result.err, "");
 }
 
-/// Whether the signals that a write may raise have this disposition.
-void expectWriteSignals(void (*disposition)(int)) {
-  for (const int number : {SIGPIPE, SIGXFSZ}) {
-    struct sigaction action = {};
-    ASSERT_EQ(sigaction(number, nullptr, &action), 0);
-    EXPECT_EQ(action.sa_handler, disposition) << number;
+/// Another disposition of a signal for the time of a scope.
+class SignalScope {
+public:
+  SignalScope(int number, void (*disposition)(int)) : number_(number), before_(signal(number, disposition)) {}
+  SignalScope(const SignalScope &) = delete;
+  SignalScope &operator=(const SignalScope &) = delete;
+  ~SignalScope() { signal(number_, before_); }
+
+private:
+  int number_;
+  void (*before_)(int);
+};
+
+bool isIgnored(int number) {
+  struct sigaction action = {};
+  return sigaction(number, nullptr, &action) == 0 && action.sa_handler == SIG_IGN;
+}
+
+TEST_F(ProcessTest, WriteSignalsAreIgnoredAndAChildGetsTheCallersSigpipe) {
+  for (const auto callers : {SIG_IGN, SIG_DFL}) { // the default last: it is remembered for other tests
+    const SignalScope onPipe(SIGPIPE, callers);
+    const SignalScope onSize(SIGXFSZ, SIG_DFL);
+    ignoreWriteSignals();
+    EXPECT_TRUE(isIgnored(SIGPIPE));
+    EXPECT_TRUE(isIgnored(SIGXFSZ));
+    EXPECT_EQ(captureShell("kill -PIPE $$; echo survived").out, callers == SIG_IGN ? "survived\n" : "");
+    EXPECT_EQ(captureShell("ulimit -c 0; kill -XFSZ $$; echo survived").out, "survived\n");
+    EXPECT_TRUE(isIgnored(SIGPIPE));
+    EXPECT_TRUE(isIgnored(SIGXFSZ));
   }
 }
 
-TEST_F(ProcessTest, WriteSignalsThatTheCallerIgnoresAreAtTheirDefaultInAProgram) {
-  setWriteSignals(SIG_IGN);
-  expectWriteSignals(SIG_IGN);
-  const CapturedRun onPipe = captureShell("kill -PIPE $$; echo survived");
-  const CapturedRun onSize = captureShell("ulimit -c 0; kill -XFSZ $$; echo survived");
-  expectWriteSignals(SIG_IGN);
-  setWriteSignals(SIG_DFL);
-  expectWriteSignals(SIG_DFL);
-  EXPECT_EQ(onPipe.out, "");
-  EXPECT_EQ(onSize.out, "");
+TEST_F(ProcessTest, ChildOfTheCallerThatEndsFirstIsReapedAndForgotten) {
+  const pid_t other = fork();
+  if (other == 0)
+    _exit(7);
+  siginfo_t ended = {};
+  ASSERT_EQ(waitid(P_PID, static_cast<id_t>(other), &ended, WEXITED | WNOWAIT), 0);
+  const CapturedRun result = captureShell("echo out; exit 3");
+  EXPECT_TRUE(result.started);
+  EXPECT_EQ(result.rc, 3);
+  EXPECT_EQ(result.out, "out\n");
+  EXPECT_EQ(waitpid(other, nullptr, WNOHANG), -1) << "no zombie is left";
+}
+
+TEST_F(ProcessTest, ChildOfTheCallerThatGoesOnIsNotWaitedFor) {
+  const pid_t other = fork();
+  if (other == 0) {
+    pause();
+    _exit(7);
+  }
+  EXPECT_EQ(captureShell("exit 3").rc, 3);
+  EXPECT_EQ(waitpid(other, nullptr, WNOHANG), 0);
+  kill(other, SIGKILL);
+  EXPECT_EQ(waitpid(other, nullptr, 0), other);
 }
 
 /// How often a pipe stands in a listing of descriptors.
@@ -348,6 +387,37 @@ TEST_F(ProcessTest, CommandGivenAsWordsIsRunTheSameWay) {
                                   processTrace("cmdArray[2]: echo $1; echo $2 >&2; exit 4"),
                                   processTrace("cmdArray[3]: sh"), processTrace("cmdArray[4]: a b"),
                                   processTrace("cmdArray[5]: c"), processTrace("runCommand exit")}));
+}
+
+/// What the system gives to whoever runs the tests, up to what the tool asks for.
+int largestPipeGiven() {
+  constexpr int Wanted = 16 * 1024 * 1024;
+  int ends[2] = {-1, -1};
+  EXPECT_EQ(pipe(ends), 0);
+  int limit = 0;
+  std::ifstream("/proc/sys/fs/pipe-max-size") >> limit; // binds ordinary users
+  const int given = std::max(fcntl(ends[0], F_SETPIPE_SZ, Wanted), std::min(limit, Wanted));
+  close(ends[0]);
+  close(ends[1]);
+  return given;
+}
+
+TEST_F(ProcessTest, PipesHoldAsMuchAsTheSystemGives) {
+  int outPipe[2] = {-1, -1};
+  int errPipe[2] = {-1, -1};
+  const int given = largestPipeGiven();
+  createPipes(outPipe, errPipe);
+  EXPECT_EQ(fcntl(outPipe[0], F_GETPIPE_SZ), given);
+  EXPECT_EQ(fcntl(errPipe[0], F_GETPIPE_SZ), given);
+  for (const int end : {outPipe[0], outPipe[1], errPipe[0], errPipe[1]})
+    close(end);
+}
+
+TEST_F(ProcessTest, ProgramThatSaysMoreThanAnUsualPipeHoldsEnds) {
+  const CapturedRun result = captureShell(writeBytes(500000) + "; " + writeBytes(500000) + " >&2; exit 6");
+  EXPECT_EQ(result.rc, 6);
+  EXPECT_EQ(result.out, std::string(KeptOfAStream, 'x'));
+  EXPECT_EQ(result.err, std::string(KeptOfAStream, 'x'));
 }
 
 TEST_F(ProcessTest, CreatePipesMakesTwoPipesReadEndFirst) {

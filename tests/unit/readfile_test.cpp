@@ -136,7 +136,7 @@ TEST_F(ReadFileTest, FileThatCannotBeOpenedIsAnInvalidArgument) {
                                   failedExit(path, InvalidArgument)}));
 }
 
-TEST_F(ReadFileTest, FileWhoseSizeNeedsMoreThan31BitsIsAnInvalidArgument) {
+TEST_F(ReadFileTest, FileWhoseSizeNeedsMoreThan31BitsIsAnInvalidArgument) { // KEEP(size-limit)
   const std::string path = write("huge", "");
   for (const off_t size : {off_t{2147483647}, off_t{2147483648}, off_t{5} << 30}) {
     ASSERT_EQ(truncate(path.c_str(), size), 0);
@@ -149,10 +149,14 @@ TEST_F(ReadFileTest, FileWhoseSizeNeedsMoreThan31BitsIsAnInvalidArgument) {
 TEST_F(ReadFileTest, FifoAndDeviceAreInvalidArgumentsAndNeverWaitedFor) {
   const std::string fifo = home() + "fifo";
   ASSERT_EQ(mkfifo(fifo.c_str(), 0600), 0);
-  EXPECT_EQ(ReadFile(fifo.c_str()).result, InvalidArgument);
-  EXPECT_EQ(ReadFile(fifo.c_str()).buffer, nullptr);
-  EXPECT_EQ(ReadFile("/dev/zero").result, InvalidArgument);
-  EXPECT_EQ(ReadFile("/dev/null").result, InvalidArgument);
+  for (const std::string &path : {fifo, std::string("/dev/zero"), std::string("/dev/null")}) {
+    const ReadFile file(path.c_str());
+    EXPECT_EQ(file.result, InvalidArgument);
+    EXPECT_EQ(file.buffer, nullptr);
+    EXPECT_EQ(logLines(),
+              (LogLines{entry(path), utilTrace("Special file specified instead of a file: " + path),
+                        failedExit(path, InvalidArgument)}));
+  }
 }
 
 TEST_F(ReadFileTest, LinkToAFileIsFollowed) {

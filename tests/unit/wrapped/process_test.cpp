@@ -6,8 +6,10 @@
 #include <string>
 #include <vector>
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <sys/wait.h>
+#include <unistd.h>
 
 #include "command.h"
 #include "systemcalls.h"
@@ -190,7 +192,37 @@ TEST_F(ProcessFailureTest, ChildThatCannotBeWaitedForFailsTheRun) {
   failCall("wait", ECHILD).times(1);
   const CapturedRun result = captureShell("true");
   EXPECT_FALSE(result.started);
-  EXPECT_GT(wait(nullptr), 0) << "the child is still to be reaped";
+  EXPECT_EQ(result.rc, -1);
+  const pid_t child = wait(nullptr);
+  EXPECT_GT(child, 0) << "the child is still to be reaped";
+  const std::string text = "Error waiting for process " + std::to_string(child) + ": No child processes";
+  EXPECT_EQ(logLines(), runTraces("true", {processError(text)}, false));
+}
+
+TEST_F(ProcessFailureTest, RefusedSizesLeaveThePipeAtTheFirstThatIsGiven) {
+  failCall("fcntl", EPERM).on(std::to_string(F_SETPIPE_SZ)).times(4); // 16, 8, 4 and 2 MiB
+  int outPipe[2] = {-1, -1};
+  int errPipe[2] = {-1, -1};
+  createPipes(outPipe, errPipe);
+  EXPECT_EQ(fcntl(outPipe[1], F_GETPIPE_SZ), 1024 * 1024);
+  for (const int end : {outPipe[0], outPipe[1], errPipe[0], errPipe[1]})
+    close(end);
+}
+
+TEST_F(ProcessFailureTest, PipeThatCannotBeEnlargedStaysAsItWas) {
+  int usual[2] = {-1, -1};
+  ASSERT_EQ(pipe(usual), 0);
+  failCall("fcntl", EPERM).on(std::to_string(F_SETPIPE_SZ));
+  int outPipe[2] = {-1, -1};
+  int errPipe[2] = {-1, -1};
+  createPipes(outPipe, errPipe);
+  EXPECT_EQ(fcntl(outPipe[1], F_GETPIPE_SZ), fcntl(usual[1], F_GETPIPE_SZ));
+  for (const int end : {usual[0], usual[1], outPipe[0], outPipe[1], errPipe[0], errPipe[1]})
+    close(end);
+  const CapturedRun result = captureShell(WritesToBoth);
+  EXPECT_EQ(result.rc, 3);
+  EXPECT_EQ(result.out + result.err, "to-out\nto-err\n");
+  EXPECT_EQ(logLines(), runTraces(WritesToBoth, {}));
 }
 
 TEST_F(ProcessFailureTest, EndOfTheChildIsWaitedForBeforeAnythingIsRead) {

@@ -104,6 +104,12 @@ TEST_F(LookUpFailureTest, ConsoleDoesNotRunWhenNobodyCanBeAsked) {
   EXPECT_FALSE(Util::isManageGUIRunning());
 }
 
+TEST_F(LookUpFailureTest, VariableThatFindsNoRoomEndsTheProcess) {
+  failCall("putenv", ENOMEM);
+  EXPECT_EXIT(Util::setEnvironment("QUILLHOME", "/elsewhere/"), ::testing::ExitedWithCode(71),
+              "^orvpatch: out of memory\n$");
+}
+
 class ReadFileFailureTest : public SystemCallTest {
 protected:
   static constexpr std::size_t Size = 12345;
