@@ -23,6 +23,9 @@
 
 namespace {
 
+/// The status of a process that ends for want of memory.
+enum ExitStatus { OutOfMemory = 71 };
+
 /// Fills `buffer` as far as the file goes; the number of bytes read, or -1 with the reason in errno.
 ssize_t readUpTo(const FileDescriptor &file, char *buffer, std::size_t size) {
   std::size_t filled = 0;
@@ -207,7 +210,6 @@ void Util::setEnvironment(const std::string &name, const std::string &value) {
 }
 
 void Util::endWithoutMemory() {
-  static constexpr int OutOfMemory = 71;
   static constexpr char message[] = "orvpatch: out of memory\n";
   static_cast<void>(!write(STDERR_FILENO, message, sizeof message - 1));
   _exit(OutOfMemory);

@@ -14,7 +14,8 @@ ROOT = FOLDER.parent
 
 def statuses_of_the_sources():
     """Every status that the program can end with: the codes of the error record and those of the driver."""
-    enumerations = [("src/nls.h", r"enum Code [^{]*\{(.*?)\}"), ("src/main.cpp", r"enum ExitStatus [^{]*\{(.*?)\}")]
+    driver = r"enum ExitStatus [^{]*\{(.*?)\}"
+    enumerations = [("src/nls.h", r"enum Code [^{]*\{(.*?)\}"), ("src/main.cpp", driver), ("src/utilities.cpp", driver)]
     bodies = [re.search(pattern, (ROOT / path).read_text(), re.S)[1] for path, pattern in enumerations]
     return sorted({int(value) for body in bodies for value in re.findall(r"= (-?\d+)", body)} - {-1})
 
