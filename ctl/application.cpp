@@ -16,6 +16,8 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   application->set_version_flag("--version", "orvpatchctl " ORVPATCHCTL_VERSION);
   application->require_subcommand(1);
   addShow(*application, invocation);
+  addStatus(*application, invocation);
+  addHistory(*application, invocation);
   return application;
 }
 

@@ -14,3 +14,11 @@ CLI::App *addCommand(CLI::App &application, Invocation &invocation, const std::s
       ->option_text("WHEN");
   return command;
 }
+
+std::shared_ptr<std::string> addHome(CLI::App &command) {
+  auto path = std::make_shared<std::string>();
+  command.add_option("home", *path, "Directory in which the product is installed")
+      ->required()
+      ->option_text("HOME");
+  return path;
+}

@@ -1,6 +1,7 @@
 // What all commands share: their common options and their exit statuses.
 #pragma once
 
+#include <memory>
 #include <string>
 
 #include "judgement.h"
@@ -29,3 +30,6 @@ struct Invocation {
 /// Adds a sub-command with the options that every command has.
 CLI::App *addCommand(CLI::App &application, Invocation &invocation, const std::string &name,
                      const std::string &description);
+
+/// Adds the home as the command's first argument; what it says when the command runs.
+std::shared_ptr<std::string> addHome(CLI::App &command);

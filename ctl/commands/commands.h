@@ -7,3 +7,5 @@ class App;
 struct Invocation;
 
 void addShow(CLI::App &application, Invocation &invocation);
+void addStatus(CLI::App &application, Invocation &invocation);
+void addHistory(CLI::App &application, Invocation &invocation);
