@@ -1,6 +1,7 @@
 # What the tool chains of the targets have in common: Debian names compiler and C library after the triplet.
 
 macro(orvpatch_cross_toolchain triplet emulator)
+  set(CMAKE_C_COMPILER ${triplet}-gcc) # for GoogleTest's build, which asks for one
   set(CMAKE_CXX_COMPILER ${triplet}-g++)
   set(CMAKE_CXX_COMPILER_TARGET ${triplet})
   # -L: the emulated program finds the target's dynamic loader and C library below this folder.

@@ -16,6 +16,7 @@ ORVPATCH_NO_SANITIZE=1 leaves the sanitized run out. The output of each stage is
 import argparse
 import concurrent.futures
 import os
+import shlex
 import shutil
 import subprocess
 import sys
@@ -129,7 +130,14 @@ def static_stages():
 
 PROGRAM_TESTS = ["tests/cases", "tests/hostile", "tests/fuzz"]
 SANITIZED = {"ASAN_OPTIONS": "abort_on_error=1", "UBSAN_OPTIONS": "print_stacktrace=1:abort_on_error=1"}
-EMULATED = {"ORVPATCH_RUNNER": "/usr/bin/qemu-ppc64le -L /usr/powerpc64le-linux-gnu"}
+# The target's programs run with the C library that they are built with, glibc 2.31; the comparison with the native
+# program has them run with the newest one.
+OLD_LIBRARIES = f"{ROOT}/build/sysroot/ppc64le/usr/powerpc64le-linux-gnu"
+NEW_LIBRARIES = "/usr/powerpc64le-linux-gnu"
+
+
+def emulated(libraries):
+    return {"ORVPATCH_RUNNER": shlex.join(["/usr/bin/qemu-ppc64le", "-L", libraries])}
 
 
 def native_stages():
@@ -147,14 +155,15 @@ def sanitized_stages():
 
 
 def target_stages(target):
-    emulated = [f"qemu-{target}", "-L", f"/usr/{target.replace('ppc64', 'powerpc64')}-linux-gnu"]
-    stages = [build(target), units(target, runner=emulated), units(target, "wrapped_tests", runner=emulated)]
+    libraries = OLD_LIBRARIES if target == "ppc64le" else "/usr/powerpc64-linux-gnu"
+    runner = [f"qemu-{target}", "-L", libraries]
+    stages = [build(target), units(target, runner=runner), units(target, "wrapped_tests", runner=runner)]
     if target == "ppc64le":
         both = {"ORVPATCH_NATIVE": str(ROOT / "build/release/orvpatch"),
                 "ORVPATCH_TARGET": str(ROOT / "build/ppc64le/orvpatch")}
-        same = cases("same-as-native", ["tests/target"], "ppc64le", {**EMULATED, **both})
+        same = cases("same-as-native", ["tests/target"], "ppc64le", {**emulated(NEW_LIBRARIES), **both})
         same.needs.append("build-release")
-        stages += [build("release"), cases("cases-ppc64le", ["tests/cases"], "ppc64le", EMULATED), same]
+        stages += [build("release"), cases("cases-ppc64le", ["tests/cases"], "ppc64le", emulated(OLD_LIBRARIES)), same]
     return stages
 
 

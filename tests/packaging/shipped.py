@@ -15,21 +15,30 @@ _SHIPPED = ["CMakeLists.txt", "CMakePresets.json", "cmake", "completions", "docs
             "CHANGELOG.md", "README.md", "SECURITY.md"]
 
 
+# The libraries of the first build; other builds get copies of them, in folders of their own.
+SYSROOTS = CHECKOUT / "build/sysroot"
+_AMD64_LIBRARIES = f"{SYSROOTS}/x86_64/usr/x86_64-linux-gnu/lib"
+
+
 class Architecture(NamedTuple):
     preset: str
     deb: str
+    triplet: str
     machine: str  # as readelf names it
     libraries: frozenset
-    runner: tuple
+    level: str  # the oldest glibc that the program starts on
+    runner: tuple  # has it run with the C library that it was built with, glibc 2.31
     packages: tuple
 
 
 AMD64 = Architecture(
-    "release", "amd64", "Advanced Micro Devices X86-64", frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), (),
+    "x86_64", "amd64", "x86_64-linux-gnu", "Advanced Micro Devices X86-64",
+    frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), "2.14",
+    (f"{_AMD64_LIBRARIES}/ld-linux-x86-64.so.2", "--library-path", _AMD64_LIBRARIES),
     ("orvpatch-{v}-linux-x86_64.tar.gz", "orvpatch_{v}-1_amd64.deb"))
 PPC64LE = Architecture(
-    "ppc64le", "ppc64el", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}),
-    ("qemu-ppc64le", "-L", "/usr/powerpc64le-linux-gnu"),
+    "ppc64le", "ppc64el", "powerpc64le-linux-gnu", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}), "2.17",
+    ("qemu-ppc64le", "-L", f"{SYSROOTS}/ppc64le/usr/powerpc64le-linux-gnu"),
     ("orvpatch-{v}-1.ppc64le.rpm", "orvpatch-{v}-linux-ppc64le.tar.gz", "orvpatch_{v}-1_ppc64el.deb"))
 ARCHITECTURES = [AMD64, PPC64LE]
 
@@ -60,11 +69,24 @@ def ship(architecture, folder, umask, **environment):
     source.mkdir(parents=True, exist_ok=True)
     with _locked(source.parent / f"{source.name}.lock"):
         _copy_sources(source)
+        sysroots = _sysroots(architecture.preset, source)
         done = subprocess.run(["packaging/pack", architecture.preset], cwd=source, umask=umask, text=True,
                               stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, check=False,
-                              env={**os.environ, "SOURCE_DATE_EPOCH": str(EPOCH), **environment})
+                              env={**os.environ, "SOURCE_DATE_EPOCH": str(EPOCH), "ORVPATCH_SYSROOTS": str(sysroots),
+                                   **environment})
     assert done.returncode == 0, done.stdout
     return Build(architecture, source / "build" / architecture.preset, done.stdout)
+
+
+def _sysroots(preset, source):
+    """Where the build in `source` finds its libraries."""
+    subprocess.run([CHECKOUT / "packaging/sysroot", preset], check=True, stdout=subprocess.DEVNULL)
+    if source.name == "a":
+        return SYSROOTS
+    copies = source / "build/sysroot"
+    copies.mkdir(parents=True, exist_ok=True)
+    subprocess.run(["cp", "-al", "--update", SYSROOTS / preset, copies], check=True)
+    return copies
 
 
 @contextlib.contextmanager

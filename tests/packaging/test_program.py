@@ -5,6 +5,8 @@ import subprocess
 
 import pytest
 
+from shipped import AMD64, CHECKOUT, PPC64LE, SYSROOTS
+
 pytestmark = pytest.mark.packages
 
 
@@ -30,10 +32,23 @@ def test_needs_the_c_library_only(elf, architecture):
 
 
 def test_c_library_level(elf, build):
-    """2.35 brings the look-up of unwinding tables that the compiler's run-time library calls."""
     levels = {tuple(map(int, level.split("."))) for level in re.findall(r"GLIBC_([\d.]+)", elf)}
-    assert max(levels) == (2, 35)
-    assert (build.folder / "libc-level").read_text() == "2.35\n"
+    assert max(levels) == tuple(map(int, build.architecture.level.split(".")))
+    assert (build.folder / "libc-level").read_text() == f"{build.architecture.level}\n"
+
+
+@pytest.mark.parametrize("page", ["README.md", "man/orvpatch.8"])
+def test_pages_tell_the_c_library_level(page):
+    told = re.findall(r"glibc ([\d.]+) or later on POWER, ([\d.]+) or later on x86-64",
+                      " ".join((CHECKOUT / page).read_text().split()))
+    assert told == [(PPC64LE.level, AMD64.level)]
+
+
+def test_runs_with_the_oldest_c_library_at_hand(architecture):
+    """The demo's run in the installed package, too, is one with this library."""
+    library = SYSROOTS / architecture.preset / f"usr/{architecture.triplet}/lib/libc.so.6"
+    done = subprocess.run([*architecture.runner, library], check=True, capture_output=True, text=True)
+    assert re.search(r"stable release version 2\.31\.", done.stdout)
 
 
 def test_is_position_independent(elf):
