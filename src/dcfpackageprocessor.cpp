@@ -14,17 +14,17 @@
 
 namespace {
 
-/// Whether the path is neither a regular file nor a directory, by its type itself: File::isFile also calls a
-/// device or a pipe a file. A directory that has taken the file's place by now is not passed over in silence.
+/// Whether the path is neither a regular file nor a directory: File::isFile is true for devices and pipes
+/// too. A directory that has replaced the file since then is not ignored silently.
 bool isSpecial(const std::string &path) {
   struct stat status = {};
   return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode);
 }
 
-/// What a target demands of the system.
+/// The requirements of a target.
 struct TargetRule {
   const char *target;
-  bool (*isInstalled)(const std::string &platform); ///< null when nothing but the version file counts
+  bool (*isInstalled)(const std::string &platform); ///< null when only the version file is required
   const char *serverCode;                           ///< the server's own product; null for agents
   const char *supportSuffix;                        ///< version file of another product's support for it
 };
@@ -49,11 +49,11 @@ void traceMissingSupport(const std::string &target, const char *product) {
     LOG_TRACE("VEMA support not installed for: %s", product);
   else if (target == "vecm")
     LOG_TRACE("VECM support not installed for: %s", product);
-  else // KEEP(vepd-veps-words): the desktop client's patch is told in the portal server's words
+  else // KEEP(vepd-veps-words): the text for the desktop client is that of the portal server
     LOG_TRACE("VEPS support not installed for: %s", product);
 }
 
-/// Whether what the patch's target needs is installed under the home.
+/// Whether the requirements of the patch's target are installed under the home.
 bool isSupported(const std::string &home, const PatchFileName &name) {
   const std::string &target = name.getTarget();
   const std::string &platform = name.getFullPlatform();
@@ -160,12 +160,11 @@ bool DCFPackageProcessor::loadDirectory(const std::string &home, File &directory
   if (!getPatchProcessors()->empty())
     return result;
   LOG_TRACE("_patchProcessors empty. No patches to install");
-  // KEEP(no-applicable-overwrites): a patch that failed before any was accepted loses its own code to this
-  // one.
+  // KEEP(no-applicable-overwrites): this code replaces that of a patch that failed before any was accepted.
   return FAILURE(error, PatchError::NoApplicablePatch, "ERROR_DCFPP_NO_APPLICABLE", path_.c_str());
 }
 
-/// Takes one entry of the directory; true when the scan goes on.
+/// Handles one entry of the directory; true when the scan goes on.
 bool DCFPackageProcessor::loadEntry(const std::string &home, const File &file, PatchError *error) {
   LOG_INFO_MESSAGE("DCFPP_PROCESS_PATCH", file.getName().c_str());
   // A pipe or a device with a patch's name is ignored: reading an archive from it could wait for ever.

@@ -1,5 +1,5 @@
-// From a path on the command line to patches applied: which of the files are patches for this system, whether
-// each may be applied, and in which order.
+// From a path on the command line to applied patches: chooses the files that are patches for this system,
+// checks each, and orders them.
 //
 // All patches are checked before the first is applied; the first failure ends the command.
 #pragma once
@@ -37,8 +37,8 @@ public:
 
   /// Platform family of this build.
   static const char *getPlatform();
-  /// Whether the patch can apply to the system at all, judged by its name and by the version files that must
-  /// exist under `home`. Leaves trace lines only.
+  /// Whether the patch can apply to this system, by its name and by the version files that must exist under
+  /// `home`. Writes trace lines only.
   static bool isApplicable(const std::string &home, const File &file);
 
 private:

@@ -1,4 +1,4 @@
-// The one failure path: format the catalogue text, log it, fill the record, be false.
+// The one failure path: format the catalogue text, log it, fill the record, return false.
 //
 // The line that detects a failure reads
 //     return FAILURE(err, PatchError::CannotRemoveDirectory, "ERROR_PP_RM_DIR", tempDir.c_str());
@@ -9,7 +9,7 @@
 
 #include "logger.h"
 
-/// Sets code and text of the record; a null record is left out.
+/// Sets code and text of the record, unless it is null.
 void fillRecord(PatchError *err, int code, const std::string &text);
 
 /// Logs the text of `key` at error level under `component`, fills the record (which may be null) and returns

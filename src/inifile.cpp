@@ -9,8 +9,8 @@
 
 namespace {
 
-/// KEEP(sorted-names): ascending byte-wise order, not file order, for all that is listed from a descriptor; a
-/// name that comes twice is one.
+/// KEEP(sorted-names): all lists of a descriptor are in ascending byte-wise order, not in file order; a
+/// repeated name is one entry.
 template <class Map>
 std::vector<std::string> keysOf(const Map &map) {
   std::vector<std::string> keys;
@@ -56,7 +56,7 @@ IniFile *IniFile::parseFile(const std::string &path, PatchError *err) {
   LOG_TRACE("IniFile::parse(%s) %s", path.c_str(), "entry");
   auto file = std::make_unique<IniFile>(path);
   if (!file->parse(err)) {
-    // The record keeps the cause that parse has put there.
+    // The record keeps the cause that parse() has stored.
     LOG_ERROR_MESSAGE("ERROR_INIFILE_PARSE", path.c_str());
     file.reset();
   }
@@ -87,8 +87,8 @@ void IniFile::parseLine(const std::string &line, Section *&current, PatchError *
     return;
   }
   if (current == nullptr) {
-    // KEEP(stray-entry): the line is skipped and parsing goes on, but the record keeps the code: the file is
-    // read, and a later failure without a code of its own would end with this one.
+    // KEEP(stray-entry): the line is skipped and the file counts as read, but the record keeps the code: a
+    // later failure without its own code ends with this one.
     FAILURE(err, PatchError::PropertyBeforeSection, "ERROR_INIFILE_PROP");
     return;
   }
@@ -102,7 +102,7 @@ void IniFile::parseLine(const std::string &line, Section *&current, PatchError *
 Section *IniFile::openSection(const std::string &line) {
   // KEEP(section-last-character): the last character is dropped whatever it is, so "[abc" names "ab".
   const std::string name = line.size() < 2 ? "" : trimmed(line.substr(1, line.size() - 2));
-  // KEEP(section-replaced): a header that comes again starts an empty section; nothing is merged.
+  // KEEP(section-replaced): a repeated header starts an empty section; nothing is merged.
   std::unique_ptr<Section> &section = sections_[name];
   section = std::make_unique<Section>(name);
   LOG_TRACE("Created section: %s", name.c_str());

@@ -1,7 +1,8 @@
 // INI files: named sections of entries, read whole, never written.
 //
-// The syntax forgives: no quoting, no escapes, no continuation; a line without "=" is an entry with an empty
-// value, which is how a descriptor lists its commands. Names come back in byte-wise order, not in file order.
+// The syntax is tolerant: no quoting, no escapes, no continuation; a line without "=" is an entry with an
+// empty value, as in the command lists of a descriptor. Names are returned in byte-wise order, not in file
+// order.
 #pragma once
 
 #include <map>

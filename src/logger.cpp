@@ -44,7 +44,7 @@ void writeText(const char *text, std::size_t length) {
     fprintf(stderr, "%s\n", message.c_str());
     return;
   }
-  // A line that the disk does not take is lost: there is nowhere left to say so.
+  // A line that cannot be written is lost: there is no other place to report it.
   static_cast<void>(file.write(text, length));
 }
 
@@ -59,7 +59,7 @@ void writeHeader() {
   writeText(header.data(), header.size());
 }
 
-/// A second and its text: the thousands of lines of one second share it, for the two conversions would take a
+/// A second and its text, shared by the thousands of lines of one second: the two conversions would take a
 /// fiftieth of a large installation's time. The zone does not change after logInit.
 struct Clock {
   time_t second = -1;
@@ -68,8 +68,8 @@ struct Clock {
 
 Clock lineClock;
 
-// "HH:MM:SS" in local time; empty when the system cannot tell it. localtime_r, unlike localtime, does not
-// look at the time-zone file again for every line, which would cost a fifth of a large installation's time.
+// "HH:MM:SS" in local time; empty when it cannot be determined. localtime_r, unlike localtime, does not check
+// the time-zone file for every line, which would take a fifth of a large installation's time.
 const char *currentTime() {
   const time_t now = time(nullptr);
   if (now == lineClock.second)
@@ -81,8 +81,8 @@ const char *currentTime() {
   return lineClock.text;
 }
 
-/// Fills in the start of a line, "LEVEL HH:MM:SS (component,line): ", piece by piece: snprintf, which knows
-/// many formats, takes a fiftieth of a large installation's time for this one. Returns its length.
+/// Fills in the start of a line, "LEVEL HH:MM:SS (component,line): ", piece by piece: snprintf would take a
+/// fiftieth of a large installation's time. Returns its length.
 std::size_t formatPrefix(char *line, logger_level level, const char *component) {
   char *to = line;
   const auto append = [&to, end = line + LineSize - 1](std::string_view piece) {

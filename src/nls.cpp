@@ -14,9 +14,9 @@ struct Entry {
   const char *text;
 };
 
-// In the order of filling. The texts are read by scripts: none is to be corrected, neither its spelling nor
-// its blanks. PP_CAB_EXTRACT, ERROR_PP_COPY_PRODEXE and PP_LIST_PRODEXES are kept for features that this
-// version does not have.
+// In the order of filling. Scripts read the texts: neither spelling nor blanks may be corrected.
+// PP_CAB_EXTRACT, ERROR_PP_COPY_PRODEXE and PP_LIST_PRODEXES are kept for features that this version does not
+// have.
 const Entry entries[] = {
     {"MAIN_SUCCESSFUL", "Command completed successfully."},
     {"MAIN_NOT_SUCCESSFUL",

@@ -1,15 +1,15 @@
 // The message catalogue and the error record.
 //
-// Every text that a user sees is looked up here by its key; scripts of operators read these texts, so they
-// stand to the byte as they were first published, misspellings included. The error record carries the first
-// failure from the operation that met it up to the driver, whose exit status is the record's code.
+// Every text for users is looked up here by its key. Scripts of operators read these texts, so they keep
+// every byte of their first publication, misspellings included. The error record carries a failure from the
+// operation that detects it up to the driver, whose exit status is the record's code.
 #pragma once
 
 #include <cstdarg>
 #include <cstdint>
 #include <string>
 
-/// True once the catalogue has been filled, which the first look-up does.
+/// True once the first look-up has filled the catalogue.
 extern bool glbInitialized;
 
 /// Namespace-like class of the catalogue look-ups. The keys are C strings because the last named parameter
@@ -26,12 +26,12 @@ public:
   static std::string getFormattedStringV(const char *key, va_list arguments);
 };
 
-/// What went wrong: a code, 0 for nothing, and the text for the user. Passed by pointer through every
+/// A failure: a code, 0 for none, and the text for the user. Passed by pointer through every
 /// operation that can fail; the pointer may be null.
 struct PatchError {
   /// The codes of the whole tool; the code of a failed run is its exit status.
   enum Code : std::int32_t {
-    ScriptFailed = -1, ///< replaced by the code of the command list before anybody sees it
+    ScriptFailed = -1, ///< replaced by the code of the command list
     None = 0,
     CannotExtract = 3,
     PropertyBeforeSection = 4,

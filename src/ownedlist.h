@@ -1,4 +1,4 @@
-// A vector of owned objects that can be handed out as the plain vector of pointers that callers walk.
+// A vector of owned objects, also available as a plain vector of pointers.
 #pragma once
 
 #include <memory>
@@ -20,7 +20,7 @@ public:
     static_cast<void>(item.release());
   }
 
-  /// The objects stay owned by the list. A caller may reorder them, but neither add nor remove any.
+  /// The objects stay owned by the list. A caller may reorder them, but not add or remove any.
   std::vector<T *> *items() { return &items_; }
   const std::vector<T *> *items() const { return &items_; }
 

@@ -7,15 +7,15 @@
 
 namespace {
 
-/// An optional key is missing: forgets the error that its look-up has just left in the record.
-/// KEEP(optional-hides-cause): once a required key is missing, the record is left as it is and names the
+/// Handles a missing optional key: removes the error of its look-up from the record.
+/// KEEP(optional-hides-cause): once a required key is missing, the record is not changed, and so names the
 /// optional key in place of the required one.
 void forgetMissing(PatchError *err, bool result) {
   if (result)
     fillRecord(err, PatchError::None, "");
 }
 
-/// "k" form of an entry name; `prefixed` tells whether the "k" was put there.
+/// "k" form of an entry name; `prefixed` is true when the "k" was added.
 std::string normalized(const std::string &name, bool &prefixed) {
   prefixed = name.size() == 2;
   return Util::normalizeProductCode(name);
@@ -44,7 +44,7 @@ PatchDescriptor *PatchDescriptor::parseFile(const std::string &path, PatchError 
     return nullptr;
   auto descriptor = std::make_unique<PatchDescriptor>();
   if (!descriptor->parse(ini.get(), err)) {
-    // The record keeps what the section builders have put there.
+    // The record keeps the error of the section builders.
     LOG_ERROR_MESSAGE("ERROR_PATCH_PARSE");
     descriptor.reset();
   }
@@ -84,7 +84,7 @@ bool PatchDescriptor::buildSections(const IniFile *ini, PatchError *err) {
   bool result = buildInfoSection(productInfo, err);
   for (const OptionalSection &optional : optionalSections) {
     const Section *const section = ini->getSection(optional.name);
-    // KEEP(no-section-after-failure): after a failure, sections that are there are traced as missing too.
+    // KEEP(no-section-after-failure): after a failure, existing sections are traced as missing too.
     if (result && section != nullptr)
       result = (this->*optional.build)(section, err);
     else
@@ -129,7 +129,7 @@ bool PatchDescriptor::buildInfoSection(const Section *section, PatchError *err) 
   const Required required[] = {{"patchName", &patchName_}, {"patchDescriptiveName", &patchDescriptiveName_},
                                {"productVer", &ver},       {"productRel", &rel},
                                {"productMod", &mod},       {"productLvl", &lvl}};
-  // A missing key does not end the search: the record ends up with the last one.
+  // A missing key does not end the search: the record names the last one.
   for (const Required &property : required)
     result = getSectionProperty(section, property.key, *property.value, err) && result;
   version_ = std::make_unique<Version>(ver.c_str(), rel.c_str(), mod.c_str(), lvl.c_str());

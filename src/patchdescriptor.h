@@ -1,8 +1,8 @@
-// patch.ini, validated and normalised: which product a patch is for, the level it brings, what must be there
-// before, whose instances must be stopped, and three lists of commands.
+// patch.ini, validated and normalised: the product of the patch, its level, its prerequisites, the products
+// whose instances must be stopped, and three lists of commands.
 //
-// Every list comes in ascending byte-wise order, not in file order, and identical lines are one entry:
-// authors who need an order number their commands.
+// Every list is in ascending byte-wise order, not in file order, and identical lines are one entry: where the
+// order counts, the names of commands begin with numbers.
 #pragma once
 
 #include <map>
@@ -48,8 +48,8 @@ public:
   std::vector<std::string> getPreCommands() const { return preCommands_; }
   std::vector<std::string> getPostCommands() const { return postCommands_; }
 
-  /// Sets `version` to the level required of `code` (normalised form); false, and untouched, when the patch
-  /// requires nothing of it.
+  /// Sets `version` to the required level of `code` (normalised form); false, with `version` untouched, when
+  /// it is not a prerequisite.
   bool getPrereqVersion(const std::string &code, Version &version) const;
 
 private:

@@ -16,8 +16,8 @@ struct PlatformFamily {
   bool wholePart; ///< the family is the whole second part, not just the prefix
 };
 
-// KEEP(lia-is-li): the first prefix that fits decides, so a name that begins with "lia" belongs to "li" and
-// the family "lia" is never given.
+// KEEP(lia-is-li): the first matching prefix decides, so a name that begins with "lia" belongs to "li", and
+// "lia" is never the family.
 const std::array<PlatformFamily, 10> families = {{{"li", false},
                                                   {"ls", false},
                                                   {"lia", false},

@@ -1,15 +1,15 @@
 // The name of a patch file: product_platform_target_fixpack.extension, for example
 // kxe_lpp266_vema_fp0001.tar.
 //
-// Whether a file is a patch, and for what, is decided from its name before the archive is opened. A name that
-// breaks the grammar is no error: isValid() is false, and a trace line tells why.
+// The name alone decides whether a file is a patch, and for which product, before the archive is opened. A
+// malformed name is no error: isValid() is false, and a trace line has the reason.
 #pragma once
 
 #include <string>
 
 class PatchFileName {
 public:
-  /// `name` is the bare name, without a directory. Parts behind the first fault stay empty.
+  /// `name` is the bare name, without a directory. Parts after the first fault stay empty.
   explicit PatchFileName(const std::string &name);
   PatchFileName(const PatchFileName &other) = default;
   PatchFileName &operator=(const PatchFileName &other) = default;

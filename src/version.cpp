@@ -54,7 +54,7 @@ void Version::set(const std::string &text) {
     LOG_TRACE("Version string provided: %s. Will pad ff with 00.", c);
     store(c, c + 3, c + 6, "00");
   } else if (text.size() == 8) {
-    // KEEP(version-unchecked): the characters are taken as they stand, dots and letters too. A level is text,
+    // KEEP(version-unchecked): the characters are not checked, dots and letters included. A level is text,
     // and version files in the field hold levels that are not digits.
     LOG_TRACE("Version string provided: %s.", c);
     store(c, c + 2, c + 4, c + 6);
@@ -75,8 +75,8 @@ std::string Version::getDottedVersionString() const {
   return std::string(vv_) + "." + rr_ + "." + mm_ + "." + ff_;
 }
 
-// KEEP(version-equality): the fix level is left out of equality but counts in the order, so that of two fix
-// levels of one modification both == and > may hold. The prerequisite checks rely on < alone.
+// KEEP(version-equality): equality ignores the fix level and the order includes it, so for two fix levels of
+// one modification both == and > may hold. The prerequisite checks rely on < alone.
 bool operator==(const Version &a, const Version &b) {
   return strcmp(a.getVV(), b.getVV()) == 0 && strcmp(a.getRR(), b.getRR()) == 0 &&
          strcmp(a.getMM(), b.getMM()) == 0;

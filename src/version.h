@@ -1,7 +1,7 @@
 // A product level VVRRMMFF: version, release, modification and fix level, two characters each.
 //
-// Levels are text, not numbers, and reading one never fails: what cannot be read becomes 06.10.00.00 and a
-// trace line. Equality leaves the fix level out while the order counts it; callers choose on purpose.
+// Levels are text, not numbers, and reading one never fails: unreadable text becomes 06.10.00.00 and a trace
+// line. Equality ignores the fix level, the order includes it; callers choose on purpose.
 #pragma once
 
 #include <string>
@@ -22,7 +22,7 @@ public:
   virtual ~Version() = default;
 
   /// Reads VVRRMM, VV.RR.MM, VVRRMMFF or VV.RR.MM.FF, told apart by length and dots alone.
-  /// Always leaves one trace line that says how the text was taken.
+  /// Always writes one trace line with the form that was recognised.
   void set(const std::string &text);
 
   /// The fields; the pointers are valid while the object lives.
@@ -45,11 +45,11 @@ private:
   char ff_[FieldSize];
 };
 
-/// Same version, release and modification; the fix level does not count.
+/// Same version, release and modification; the fix level is ignored.
 bool operator==(const Version &a, const Version &b);
 bool operator!=(const Version &a, const Version &b);
 
-/// Byte-wise order of the plain version strings; the fix level counts.
+/// Byte-wise order of the plain version strings, fix level included.
 bool operator<(const Version &a, const Version &b);
 bool operator<=(const Version &a, const Version &b);
 bool operator>(const Version &a, const Version &b);

@@ -14,7 +14,7 @@ namespace {
 
 using Instances = std::vector<std::string>;
 
-/// Whether an instance is left alone: two helpers of the universal agent run for all its other instances.
+/// Whether an instance is never stopped: two helpers of the universal agent run for all its other instances.
 bool isLeftRunning(const std::string &code, const std::string &instance) {
   if (code != "kwn")
     return false;
@@ -24,12 +24,12 @@ bool isLeftRunning(const std::string &code, const std::string &instance) {
   return true;
 }
 
-/// Of codes that the patch's own product has joined, so that there is at least one.
+/// For a list that includes the patch's own product, and so is never empty.
 bool meansAll(const std::vector<std::string> &codes) {
   return codes.front() == "all";
 }
 
-/// The component of a listed product, unless it is not installed or nothing of it runs.
+/// The component of a listed product; null when it is not installed or has no running instance.
 ORVComponent *runningComponent(const std::string &code) {
   ORVComponent *const component = getComponent(code);
   if (component == nullptr)
@@ -46,7 +46,7 @@ void traceProduct(const ORVComponent &component) {
             component.getDescriptiveName().c_str());
 }
 
-/// Stops the instances of one component when all agents are stopped; false at the first that does not stop.
+/// Stops the instances of one component when all agents are stopped; false at the first failure.
 bool stopAgent(ORVComponent &component, Instances &stopped, PatchError *err) {
   const std::string name = component.getName();
   for (const std::string &instance : component.getActiveInstances()) {
@@ -112,7 +112,7 @@ bool PatchProcessor::buildDependentsList(PatchError *) {
     return true;
   std::vector<std::string> codes = descriptor_->getDependents();
   // KEEP(report-own-code-twice): unlike stopDependents, the report adds the patch's own product even when it
-  // is listed already; the second look replaces the first.
+  // is listed already; the second look-up replaces the first.
   codes.push_back(descriptor_->getProductCode());
   if (meansAll(codes))
     collectAll();

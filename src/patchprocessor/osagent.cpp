@@ -1,5 +1,5 @@
-// The OS agent has a restart rule of its own: after every attempt, whatever its outcome, the agent is told
-// the result through a file and its default instance is started, when an instance of it was stopped.
+// The restart rule of the OS agent: when an instance of it was stopped, the result of the attempt, good or
+// bad, is written to a file for it, and its default instance is started.
 #include "patchprocessor/patchprocessor.h"
 
 #include <cerrno>
@@ -25,7 +25,7 @@ bool PatchProcessor::startOSAgentIfNeeded(int resultCode, PatchError *err) {
     if (agent == nullptr) {
       LOG_TRACE("Could not get OSAgent from Registry");
     } else {
-      // KEEP(osagent-default-instance): the default instance is started whatever the names of those stopped.
+      // KEEP(osagent-default-instance): the default instance is started, whichever instances were stopped.
       result = agent->startInstance(ORVComponent::DEFAULT_INSTANCE, err);
     }
   }
@@ -33,7 +33,7 @@ bool PatchProcessor::startOSAgentIfNeeded(int resultCode, PatchError *err) {
   return result;
 }
 
-/// A depot that is missing does not keep the agent from being started.
+/// A missing depot does not prevent the start of the agent.
 void PatchProcessor::writeResultFile(int resultCode) const {
   const std::string path = home_ + "vmaorv6/agentdepot/rc.txt";
   const FileDescriptor file(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC);

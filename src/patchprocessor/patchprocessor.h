@@ -1,8 +1,8 @@
 // One patch file applied to one home.
 //
-// The caller creates a processor, initializes it, asks the two checks, and then either runs or test-runs it
-// with cleanUp around that. Every operation that takes an error record accepts null, logs its failure, and
-// answers false; the first failure ends what it belongs to and nothing is undone.
+// The caller creates a processor, initializes it, calls the two checks, and then run() or testRun() with
+// cleanUp() before and after. Every operation that takes an error record accepts null, logs its failure, and
+// returns false; the first failure ends a sequence, and nothing is undone.
 #pragma once
 
 #include <map>
@@ -46,18 +46,17 @@ public:
   const PatchDescriptor *getDescriptor() const { return descriptor_.get(); } ///< null before initialize()
   std::string getPatchFilename();                                            ///< the path as given
 
-  // prerequisites.cpp: may the patch be applied at all
+  // prerequisites.cpp: checks before a patch is applied
 
   /// False while the server or console that the patch touches runs: codes 35 to 37, with an empty text in the
   /// record, since the message has been printed to standard error already.
   bool checkForActivePrograms(PatchError *err);
   /// Installed level and prerequisites: codes 9 to 11.
   bool checkPrereqs(PatchError *err);
-  /// The architecture that the component's own prerequisite list gives for a product; "none" or empty when
-  /// it names none.
+  /// The architecture of a product in the component's own prerequisite list; "none" or empty without one.
   std::string getArchFromPrereqs(const std::string &prereq, std::vector<std::string> componentPrereqs);
 
-  // dependents.cpp: the instances that a patch stops and starts again
+  // dependents.cpp: the instances that are stopped and started again
 
   bool buildDependentsList(PatchError *err);
   bool printDependentsList(PatchError *err);
@@ -69,12 +68,12 @@ public:
   /// Hands `resultCode` to the OS agent and starts its default instance, when an instance of it was stopped.
   bool startOSAgentIfNeeded(int resultCode, PatchError *err);
 
-  // scripts.cpp: the commands that a patch brings
+  // scripts.cpp: the commands of a patch
 
   bool runPrePatchScripts(PatchError *err); ///< code 22
   bool runPreScripts(PatchError *err);      ///< code 21
   bool runPostScripts(PatchError *err);     ///< code 23
-  /// Runs the commands in order from the temporary directory, which leads PATH meanwhile; codes -1 and 24.
+  /// Runs the commands in order from the temporary directory, which is first in PATH; codes -1 and 24.
   bool runScripts(std::vector<std::string> commands, PatchError *err);
 
   // fileinstall.cpp: updated_files
@@ -91,7 +90,7 @@ public:
   /// Appends a new File, which the caller owns, for every copy of the product executable.
   bool findProductEXEFiles(std::vector<File *> &found, PatchError *err);
 
-  // records.cpp: what remains of a patch
+  // records.cpp: version file and history
 
   bool updatePatchVerFile(PatchError *err); ///< code 28
   void updatePatchRegistry(bool passed);
@@ -127,7 +126,7 @@ private:
   std::map<std::string, Instances> dependents_;
 };
 
-/// Product code of the OS agent, which has a restart rule of its own.
+/// Product code of the OS agent, which has its own restart rule.
 extern const std::string glbOsAgentPC;
 
 /// Kind of component that a patch is for, by the target of its file name.

@@ -93,7 +93,7 @@ bool PatchProcessor::checkPrereqs(PatchError *err) {
 bool PatchProcessor::verifyPrereqs(PatchError *err) {
   const PatchFileName fileName = patchFileName();
   const std::string product = descriptor_->getProductCode();
-  // KEEP(support-patch-refused): the patched component is looked for under the target's kind and the full
+  // KEEP(support-patch-refused): the patched component is looked up by the target's kind and the full
   // platform. The version file of a server's support for another product, such as oxvms.ver, has "vms" where
   // the platform stands, so such a patch is refused here.
   const ORVComponent *const installed = ORVComponentRegistry::getInstance()->getInstalledComponentByArch(

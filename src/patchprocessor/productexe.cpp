@@ -1,5 +1,5 @@
 // Copies of the product executable. Both steps are placeholders in this version: they trace and succeed. The
-// search that would feed them is complete, but no step calls it.
+// search for them is complete, but no step calls it.
 #include "patchprocessor/patchprocessor.h"
 
 #include "logger.h"
@@ -9,19 +9,19 @@
 
 namespace {
 
-/// What follows the first "." in lower case; empty without one.
+/// The text after the first "." in lower case; empty without one.
 std::string extensionOf(const std::string &name) {
   const std::size_t point = name.find('.');
   return point == std::string::npos ? "" : Util::toLower(name.substr(point + 1));
 }
 
-/// What precedes the first "." in lower case; a name without one is taken unchanged.
+/// The text before the first "." in lower case; a name without one is unchanged.
 std::string baseOf(const std::string &name) {
   const std::size_t point = name.find('.');
   return point == std::string::npos ? name : Util::toLower(name.substr(0, point));
 }
 
-/// A copy bears a name that begins as the executable's and has the same extension, in any case of letters.
+/// The name of a copy begins like the executable's and has the same extension, ignoring case.
 bool isCopyOf(const std::string &exe, const std::string &name) {
   const std::string lowerName = Util::toLower(name);
   return lowerName.rfind(baseOf(exe), 0) == 0 && lowerName != exe && extensionOf(name) == extensionOf(exe);

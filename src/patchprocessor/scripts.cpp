@@ -1,4 +1,4 @@
-// The commands that a patch brings along, run at three fixed points from the extracted archive.
+// The commands of a patch, run at three fixed points from the extracted archive.
 #include "patchprocessor/patchprocessor.h"
 
 #include <cstdlib>
@@ -11,7 +11,7 @@
 
 namespace {
 
-/// Puts a directory at the front of PATH as long as it lives.
+/// Keeps a directory at the front of PATH during its lifetime.
 class PathWith {
 public:
   explicit PathWith(const std::string &directory) {
@@ -33,8 +33,8 @@ private:
   std::string oldPath_;
 };
 
-/// KEEP(script-code-replaced): whatever ended a list, its place in the sequence gives the code; the text
-/// stays.
+/// KEEP(script-code-replaced): the code of a failed list is that of its place in the sequence, whatever the
+/// reason; the text stays.
 bool withCode(PatchError::Code code, bool result, PatchError *err) {
   if (!result && err != nullptr)
     err->code = code;
@@ -42,7 +42,7 @@ bool withCode(PatchError::Code code, bool result, PatchError *err) {
 }
 
 /// Runs one command.
-/// KEEP(command-is-program): the whole text is the name of the program; no shell reads it, blanks belong to
+/// KEEP(command-is-program): the whole text is the name of the program, blanks included; no shell interprets
 /// it.
 bool runScript(const std::string &command, PatchError *err) {
   LOG_INFO_MESSAGE("PP_PROCESS_SCRIPT", command.c_str());
