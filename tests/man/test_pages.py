@@ -13,10 +13,9 @@ ROOT = FOLDER.parent
 
 
 def statuses_of_the_sources():
-    """Every status that the program can end with: the codes of the error record and those of the driver."""
-    driver = r"enum ExitStatus [^{]*\{(.*?)\}"
-    enumerations = [("src/nls.h", r"enum Code [^{]*\{(.*?)\}"), ("src/main.cpp", driver), ("src/utilities.cpp", driver)]
-    bodies = [re.search(pattern, (ROOT / path).read_text(), re.S)[1] for path, pattern in enumerations]
+    """Every status that the program can end with: the codes of the error record, and what is an ExitStatus."""
+    sources = "".join(path.read_text() for path in sorted((ROOT / "src").glob("*.*")))
+    bodies = re.findall(r"enum (?:Code|ExitStatus)\b[^{]*\{(.*?)\}", sources, re.S)
     return sorted({int(value) for body in bodies for value in re.findall(r"= (-?\d+)", body)} - {-1})
 
 
