@@ -18,6 +18,7 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   addShow(*application, invocation);
   addStatus(*application, invocation);
   addHistory(*application, invocation);
+  addVerify(*application, invocation);
   return application;
 }
 

@@ -22,3 +22,12 @@ std::shared_ptr<std::string> addHome(CLI::App &command) {
       ->option_text("HOME");
   return path;
 }
+
+void addInstallerOptions(CLI::App &command, InstallerOptions &options) {
+  command
+      .add_option("--installer", options.file,
+                  "The installer to run, in place of the one beside this program")
+      ->option_text("FILE");
+  command.add_option("--path", options.searchPath, "Where the installer's tools are looked for")
+      ->option_text("LIST");
+}

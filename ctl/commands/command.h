@@ -4,6 +4,7 @@
 #include <memory>
 #include <string>
 
+#include "installer.h"
 #include "judgement.h"
 #include "output.h"
 
@@ -33,3 +34,6 @@ CLI::App *addCommand(CLI::App &application, Invocation &invocation, const std::s
 
 /// Adds the home as the command's first argument; what it says when the command runs.
 std::shared_ptr<std::string> addHome(CLI::App &command);
+
+/// Adds --installer and --path.
+void addInstallerOptions(CLI::App &command, InstallerOptions &options);

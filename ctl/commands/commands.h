@@ -9,3 +9,4 @@ struct Invocation;
 void addShow(CLI::App &application, Invocation &invocation);
 void addStatus(CLI::App &application, Invocation &invocation);
 void addHistory(CLI::App &application, Invocation &invocation);
+void addVerify(CLI::App &application, Invocation &invocation);

@@ -1,0 +1,154 @@
+// The home itself: its path, tmp, what an earlier run left there, who may write where, and who else is at
+// work.
+#include <cctype>
+#include <cerrno>
+#include <climits>
+#include <cstdlib>
+#include <cstring>
+#include <filesystem>
+
+#include <dirent.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "check/hostcheck.h"
+#include "homelock.h"
+#include "processes.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+
+std::string withoutSlash(std::string path) {
+  while (path.size() > 1 && path.back() == '/')
+    path.pop_back();
+  return path;
+}
+
+std::string canonical(const std::string &path) {
+  char *const resolved = realpath(path.c_str(), nullptr);
+  const std::string result = resolved == nullptr ? "" : resolved;
+  free(resolved);
+  return result;
+}
+
+bool isPlain(const std::string &path) {
+  for (const char c : path)
+    if (isalnum(static_cast<unsigned char>(c)) == 0 && strchr("/_-.+", c) == nullptr)
+      return false;
+  return true;
+}
+
+void checkPath(HostCheck &check) {
+  const std::string path = withoutSlash(check.home);
+  const auto wrong = [&](const std::string &text) { check.add("home-path", "", path, text); };
+  if (path.front() != '/')
+    wrong("the path is relative");
+  else if (canonical(path) != path)
+    wrong("the path leads over links, \"..\" or double slashes to " + canonical(path));
+  if (!isPlain(path))
+    wrong("the path has characters other than letters, digits and / _ - . +");
+  if (path.find("grep") != std::string::npos)
+    wrong("the path contains the word grep");
+}
+
+std::string ownerText(const struct stat &status) {
+  return "owner " + loginName(status.st_uid) + ", mode " + std::to_string((status.st_mode >> 6) & 7) +
+         std::to_string((status.st_mode >> 3) & 7) + std::to_string(status.st_mode & 7);
+}
+
+void checkTmp(HostCheck &check) {
+  const std::string path = check.home + "tmp";
+  struct stat status = {};
+  if (lstat(path.c_str(), &status) != 0)
+    return;
+  if (S_ISLNK(status.st_mode))
+    return check.add("home-tmp", "", "tmp", "it is a symbolic link");
+  if (!S_ISDIR(status.st_mode))
+    return check.add("home-tmp", "", "tmp", "it is no directory");
+  if (status.st_uid != geteuid() || (status.st_mode & 0022) != 0)
+    check.add("home-tmp", "", "tmp", ownerText(status));
+}
+
+/// The first file below updated_files of a temporary directory that the home lacks; empty when it has them
+/// all.
+std::string onlyCopy(const std::string &home, const std::string &directory) {
+  const fs::path root = directory + "/updated_files";
+  std::error_code error;
+  for (fs::recursive_directory_iterator entry(root, error), end; !error && entry != end;
+       entry.increment(error)) {
+    struct stat status = {};
+    const std::string relative = entry->path().string().substr(root.string().size() + 1);
+    if (!entry->is_directory(error) && lstat((home + relative).c_str(), &status) != 0 && errno == ENOENT)
+      return relative;
+  }
+  return "";
+}
+
+void checkLeftovers(HostCheck &check) {
+  for (const std::string &code : check.temporaryCodes()) {
+    const std::string directory = check.home + "tmp/" + code;
+    struct stat status = {};
+    if (code.empty() || lstat(directory.c_str(), &status) != 0)
+      continue;
+    const std::string lacking = S_ISDIR(status.st_mode) ? onlyCopy(check.home, directory) : "";
+    if (lacking.empty())
+      check.add("tmp-leftover", "", "tmp/" + code, "left by an earlier run");
+    else
+      check.addAs(Severity::Error, "tmp-leftover", "", "tmp/" + code,
+                  "it holds " + lacking + ", which the home lacks");
+  }
+}
+
+void checkPatchPlace(HostCheck &check) {
+  const std::string tmp = canonical(check.home + "tmp");
+  for (const std::string &file : check.files) {
+    const std::string place = canonical(file);
+    if (!tmp.empty() && place.compare(0, tmp.size() + 1, tmp + "/") == 0)
+      check.add("patch-in-tmp", fs::path(file).filename(), place, "the installer would remove it");
+  }
+}
+
+/// Whether others than root and the runner may change what stands at the path; one that is missing is left
+/// out.
+void checkWriters(HostCheck &check, const char *rule, const std::string &relative) {
+  struct stat status = {};
+  if (stat((check.home + relative).c_str(), &status) != 0)
+    return;
+  const bool foreignOwner = status.st_uid != 0 && status.st_uid != geteuid();
+  if (foreignOwner || (status.st_mode & 0022) != 0)
+    check.add(rule, "", relative, ownerText(status));
+}
+
+void checkRegistryWriters(HostCheck &check) {
+  checkWriters(check, "registry-writable", "registry");
+  std::error_code error;
+  std::set<std::string> names;
+  for (const fs::directory_entry &entry : fs::directory_iterator(check.home + "registry", error))
+    if (entry.path().extension() == ".ver")
+      names.insert(entry.path().filename());
+  for (const std::string &name : names)
+    checkWriters(check, "registry-writable", "registry/" + name);
+}
+
+void checkOtherRuns(HostCheck &check) {
+  for (const std::string &run : installerRuns(check.home))
+    check.add("other-run", "", "", run);
+  if (check.has("other-run"))
+    return;
+  if (isHomeLocked(check.home))
+    check.add("other-run", "", "", "a transaction of orvpatchctl holds the home");
+}
+
+} // namespace
+
+void checkHome(HostCheck &check) {
+  checkPath(check);
+  checkTmp(check);
+  checkLeftovers(check);
+  checkPatchPlace(check);
+  checkRegistryWriters(check);
+  checkWriters(check, "runinfo-writable", "config/.ConfigData");
+  checkWriters(check, "runinfo-writable", "config/.ConfigData/RunInfo");
+  checkOtherRuns(check);
+}

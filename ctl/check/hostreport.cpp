@@ -1,0 +1,70 @@
+#include "check/hostreport.h"
+
+#include <algorithm>
+#include <iterator>
+#include <utility>
+
+#include "check/hostcheck.h"
+#include "dcfpackageprocessor.h"
+#include "file.h"
+#include "lint/lint.h"
+#include "utilities.h"
+
+namespace {
+
+bool hasRule(const FindingList &findings, const std::string &rule) {
+  return std::any_of(findings.begin(), findings.end(),
+                     [&rule](const Finding &finding) { return finding.rule == rule; });
+}
+
+/// The report would remove another run's directory or the patch itself, would never end, or would remove what
+/// may be the only copy of a file.
+bool wouldHarm(const FindingList &findings) {
+  for (const char *rule : {"other-run", "patch-in-tmp", "tar-too-loud", "tmp-leftover"})
+    if (hasRule(findings, rule))
+      return true;
+  return false;
+}
+
+/// Patches that the installer would not take on this home are left to its report.
+HostCheck subjectOf(const Home &home, const std::string &path, const CheckOptions &options) {
+  HostCheck check;
+  check.home = home.path();
+  check.searchPath = options.installer.searchPath;
+  check.keyring = options.keyring;
+  check.files = patchFiles(path);
+  for (const std::string &file : check.files) {
+    if (!DCFPackageProcessor::isApplicable(home.path(), File(file)))
+      continue;
+    Patch patch = readPatch(file);
+    if (patch.descriptor != nullptr)
+      check.patches.push_back(std::move(patch));
+  }
+  return check;
+}
+
+std::string trimmed(std::string text) {
+  Util::trimString(text);
+  return text;
+}
+
+} // namespace
+
+CheckResult checkInstallation(const Home &home, const std::string &path, const CheckOptions &options) {
+  CheckResult result;
+  result.findings = lint(path);
+  HostCheck check = subjectOf(home, path, options);
+  checkHome(check);
+  checkTargets(check);
+  checkAgents(check);
+  checkTools(check);
+  checkSignatures(check);
+  if (options.withReport && !wouldHarm(check.findings()) && !wouldHarm(result.findings)) {
+    result.report = runReport(options.installer, home.path(), path);
+    if (result.report->status != 0)
+      check.add("installer-refuses", "", "status " + std::to_string(result.report->status),
+                trimmed(result.report->err));
+  }
+  std::move(check.findings().begin(), check.findings().end(), std::back_inserter(result.findings));
+  return result;
+}

@@ -1,0 +1,49 @@
+// Proof after an installation: every member of updated_files stands in the home as the archive has it, the
+// version file has the patch's level, and the history says PASS.
+//
+// The installer ends well where files are silently missing (a source that was not there, a directory that it
+// could not open), so its verdict is no proof. Owner and mode are not compared: a replaced file keeps its
+// own.
+#pragma once
+
+#include <set>
+#include <string>
+#include <vector>
+
+#include <nlohmann/json_fwd.hpp>
+
+#include "patch.h"
+
+struct Difference {
+  std::string path; ///< relative to the home
+  std::string kind; ///< missing, type, content, level, history, mode, owner or instance
+  std::string text;
+};
+
+struct Verification {
+  std::vector<Difference> differences;
+  std::size_t files = 0; ///< members of updated_files that are no directories
+
+  void add(const std::string &path, const std::string &kind, const std::string &text) {
+    differences.push_back({path, kind, text});
+  }
+  void append(const Verification &other) {
+    files += other.files;
+    differences.insert(differences.end(), other.differences.begin(), other.differences.end());
+  }
+};
+
+/// Compares the members of updated_files with the home, which ends in "/". A later member of the same name
+/// replaces an earlier one, as in an extraction. JudgementError when the archive or a file of the home cannot
+/// be read to its end: what cannot be seen is not judged.
+void verifyFiles(const std::string &home, const Patch &patch, std::set<std::string> &covered,
+                 Verification &verification);
+
+/// Compares every VRMF line of the version file that the patch rewrites with the patch's level.
+void verifyLevel(const std::string &home, const Patch &patch, Verification &verification);
+
+/// Asks the last history line of this patch (product, platform, target and name) for its result.
+void verifyHistory(const std::string &home, const Patch &patch, Verification &verification);
+
+/// {"differences": [...], "files": N}
+nlohmann::ordered_json toJson(const Verification &verification);
