@@ -111,7 +111,7 @@ class Site:
     # --- people ----------------------------------------------------------------------------------------
 
     def as_ordinary_user(self):
-        """From now on the program runs as somebody to whom permission bits apply: an account that gets
+        """From now on the program runs as a user to whom permission bits apply: an account that gets
         the home when the tests run as root, their own user otherwise."""
         if os.geteuid() == 0:
             self.user = "nobody"

@@ -45,7 +45,7 @@ def test_an_odd_home(site, path):
 
 
 def test_an_empty_home_is_the_root_directory(site):
-    """Nobody may write there: each line of the log is lost with a message, and the work is done."""
+    """A folder without write permission: each line of the log is lost with a message, and the work is done."""
     site.user = "nobody" if os.geteuid() == 0 else None
     path = site.descriptor(Patch("ox").descriptor_text())
     result = site.run("-h", "", "-vi", path)

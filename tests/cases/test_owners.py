@@ -1,4 +1,4 @@
-"""Agents of other users: the program as root switches to the owner, anybody else refuses."""
+"""Agents of other users: as root the program switches to the owner, as any other user it refuses."""
 
 import os
 import pwd
@@ -69,7 +69,7 @@ FOREIGN = 1  # the process id of the first process, which belongs to root
 
 @pytest.fixture
 def ordinary(site):
-    """The program runs as somebody else than root."""
+    """The program runs as another user than root."""
     if os.stat(f"/proc/{FOREIGN}").st_uid != 0:
         pytest.skip("process 1 does not belong to root here")
     site.as_ordinary_user()

@@ -11,7 +11,7 @@
 
 namespace {
 
-/// Standard output as PATCH_DEBUG would have it, since that is buffered, with nobody who reads it.
+/// Standard output as with PATCH_DEBUG, since that is buffered, without a reader.
 bool silenceLog() {
   glbLogToSTDOUT = true;
   return freopen("/dev/null", "w", stdout) != nullptr;

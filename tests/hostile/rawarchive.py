@@ -1,4 +1,4 @@
-"""Archives that tar(1) would not make: written member by member, as whoever means harm can write them."""
+"""Archives that tar(1) would not make: written member by member, as an attacker can."""
 
 import io
 import tarfile

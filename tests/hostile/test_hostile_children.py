@@ -169,7 +169,7 @@ LARGEST_PIPE = 16 * 1024 * 1024
 
 
 def pipe_of_the_own_user():
-    """How many bytes a child may say: what the system gives to whoever runs the tests."""
+    """How many bytes a child may print: what the system gives the user of the tests."""
     ends = os.pipe()
     try:
         fcntl.fcntl(ends[0], fcntl.F_SETPIPE_SZ, LARGEST_PIPE)

@@ -14,7 +14,7 @@ PATCH = Patch("ox")
 
 @pytest.fixture
 def foreign(scratch):
-    """A directory outside the home with one file that nobody else may read."""
+    """A directory outside the home with one file that no other user may read."""
     folder = scratch / "foreign"
     folder.mkdir()
     (folder / "secret").write_text("secret\n")

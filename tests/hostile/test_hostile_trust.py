@@ -1,4 +1,4 @@
-"""Every claim of SECURITY.md, tried out: who can make the user who patches do what, and what keeps them from it."""
+"""Every claim of SECURITY.md, tried out: what other users can make of a run, and what prevents it."""
 
 import os
 import struct
@@ -28,7 +28,7 @@ def await_file(path, seconds=30):
         time.sleep(0.01)
 
 
-# --- who writes what commands the user who patches ---------------------------------------------------------
+# --- write access that gives the rights of the user who patches ---------------------------------------------------------
 
 
 @pytest.mark.needs_root
@@ -78,7 +78,7 @@ printf '#!/bin/sh\\nid -u >"$QUILLHOME/mark"\\n' >"$1/tmp/kox/mine" && chmod 755
 
 @pytest.mark.needs_root
 @pytest.mark.parametrize("mode, taken_over", [(0o755, True), (0o777, True), (0o1777, True), (0o700, False)])
-def test_whoever_may_enter_tmp_can_replace_a_command_that_runs_next(
+def test_a_user_who_may_enter_tmp_can_replace_a_command_that_runs_next(
         program, product, patch_dir, mode, taken_over):
     product.mkdir("tmp", mode)
     archive = Patch("ox").script(
@@ -164,7 +164,7 @@ def test_any_user_can_become_the_owner_of_a_process_in_the_tools_eyes(program, p
     words = [message.split(": ", 1)[1] for message in product.log().messages("TRACE", "process.cpp")
              if message.startswith("cmdArray[")]
     assert words[-5:] == ["/bin/su", "-", "nobody", "-c", f"{product.prefix}bin/QuillAgent  start yn"]
-    assert result.status == 12  # nobody has no shell to start it with
+    assert result.status == 12  # the account has no shell to start it with
 
 
 @pytest.mark.needs_root

@@ -61,7 +61,7 @@ def files_below(members, top):
 
 
 def check_form(members):
-    """Sorted, owned by root, of one time, readable by all and written by nobody else."""
+    """Sorted, owned by root, of one time, readable by all and writable by no other user."""
     names = [member.name.removeprefix("./") for member in members]
     assert names == sorted(names)
     assert {(member.uid, member.gid, member.mtime) for member in members} == {(0, 0, EPOCH)}
@@ -104,7 +104,7 @@ def test_deb_control(build):
 
 @for_power
 def test_rpm_requirements(rpm):
-    """What the program needs, and nothing about a shell or library that nobody asked for."""
+    """What the program needs, and no shell or library besides."""
     required = set(output_of("rpm", "-qp", "--requires", rpm).decode().splitlines())
     by_loader = {name for name in required if re.match(r"(libc|ld64)\.so|rtld|rpmlib", name)}
     assert required - by_loader == {"(procps-ng or procps)", "tar", "grep", "util-linux"}

@@ -7,7 +7,7 @@ from pathlib import Path
 from typing import NamedTuple
 
 # Test processes that run side by side each have an account of their own. ps shows names of up to eight
-# characters; digits in a name could be taken for a process id by whoever searches the output of ps for one.
+# characters; digits in a name could be taken for a process id in the output of ps.
 _NAME = "orv" + "".join(chr(ord("a") + os.getpid() // 26**place % 26) for place in range(5))
 _UID = 60000 + os.getpid() % 5000
 

@@ -8,7 +8,7 @@ from pathlib import Path
 
 def scratch_folder():
     """A new temporary folder. Its name holds letters only: digits in a command line could be taken for a
-    process id by whoever searches the output of ps for one."""
+    process id in the output of ps."""
     while True:
         name = "".join(chr(ord("a") + byte % 26) for byte in os.urandom(10))
         folder = Path(tempfile.gettempdir()) / f"orvpatch-{name}"

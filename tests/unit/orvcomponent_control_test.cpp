@@ -195,7 +195,7 @@ TEST_F(StartTest, OwnerCountsForEachInstanceAlone) {
   kox->startInstance("new", &err);
   EXPECT_EQ(linesOf("process.cpp", logLines()),
             commandLines({"/bin/sh", "-c", agentScript() + " -o new start ox"}))
-      << "an instance that nobody owned is the user's own";
+      << "an instance without an owner is the user's own";
 }
 
 TEST_F(StartTest, RootStartsTheInstanceOfAnotherAsItsOwner) {

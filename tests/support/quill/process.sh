@@ -9,8 +9,8 @@ die() { # STATUS MESSAGE
 }
 
 # spawn FILE: starts a process that lives until it is killed and names FILE in its command line; prints its
-# process id and that of its keeper. The keeper is the parent that reaps it, for a dead process that nobody
-# reaps still shows in ps. Neither holds a descriptor of the caller (a pipe, above all) or its directory; it
+# process id and that of its keeper. The keeper is the parent that reaps it: a dead process that is not
+# reaped still shows in ps. Neither holds a descriptor of the caller (a pipe, above all) or its directory; it
 # takes bash to close descriptors of two digits.
 spawn() {
   # shellcheck disable=SC2016
