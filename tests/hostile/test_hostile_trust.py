@@ -9,6 +9,7 @@ from pathlib import Path
 
 import pytest
 
+from rawarchive import RawArchive
 from support import Patch, stubs
 from verdicts import INSTALLED, refused
 
@@ -65,6 +66,27 @@ def test_log_and_history_are_written_through_links(program, product, patch_dir, 
     assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir)) == INSTALLED
     assert (scratch / "foreign").read_bytes().startswith(b"first\n")
     assert (scratch / "foreign").stat().st_size > len("first\n")
+
+
+@pytest.mark.needs_root
+def test_a_report_makes_set_id_files_for_its_duration(program, product, patch_dir, scratch):
+    archive = RawArchive(Patch("ox")).file("updated_files/tool", mode=0o6755, uid=NOBODY).write(patch_dir)
+    look = 'PATH=${PATH#*:}; tar "$@"; status=$?; stat -c "%a %u" updated_files/tool; exit $status'
+    path = stubs(scratch / "bin", tar=look)
+    assert program.report(product, archive, env={"PATH": path}).status == 0
+    assert f"stdout: 6755 {NOBODY}\n" in product.log().messages("TRACE", "patchprocessor")
+    assert not product.exists("tmp/kox")
+
+
+def test_descriptors_of_the_caller_are_open_in_every_child_unless_closed(program, product, patch_dir):
+    product.start("ox")
+    archive = Patch("ox").script("a.sh", "pre", body='[ ! -e /proc/self/fd/9 ] || touch "$QUILLHOME/open"').write(patch_dir)
+    assert program.install(product, archive, wrapper=["sh", "-c", 'exec "$@" 9</dev/null', "sh"]) == INSTALLED
+    assert product.exists("open")
+    product.remove("open")
+    closed = ["sh", "-c", 'exec 9</dev/null; exec "$@" 9<&-', "sh"]
+    assert program.install(product, archive, wrapper=closed) == INSTALLED
+    assert not product.exists("open")
 
 
 # --- the temporary directory -------------------------------------------------------------------------------
