@@ -1,19 +1,25 @@
 # Completion of orvpatch for bash: the options that are still missing, then what fits the option before.
 
 # Offers the directories that begin with the word, and the files of these that match one of the patterns.
-# Readline marks a directory by itself and lets the user go on in it.
+# Readline marks a directory by itself and lets the user go on in it. A word that begins with the home as ~ is
+# completed with it; $HOME is replaced by its value, since readline would quote the dollar.
 _orvpatch_paths() {
-  local word=$1 path pattern
+  local word=$1 typed='' path pattern
   shift
+  case $word in
+    \~/*) typed="~" word=$HOME${word:1} ;;
+    "\$HOME/"*) word=$HOME${word:5} ;;
+    "\${HOME}/"*) word=$HOME${word:7} ;;
+  esac
   compopt -o filenames 2>/dev/null
   while IFS= read -r path; do
     if [[ -d $path ]]; then
-      COMPREPLY+=("$path")
+      COMPREPLY+=("$typed${path#"${typed:+$HOME}"}")
       continue
     fi
     for pattern in "$@"; do
       # shellcheck disable=SC2053 # matched as a pattern on purpose
-      [[ ${path##*/} == $pattern ]] && COMPREPLY+=("$path")
+      [[ ${path##*/} == $pattern ]] && COMPREPLY+=("$typed${path#"${typed:+$HOME}"}")
     done
   done < <(compgen -f -- "$word")
 }

@@ -11,14 +11,25 @@ function __orvpatch_open
     return 0
 end
 
-# The directories that begin with the current word, and the files of these whose names match.
+# The directories that begin with the current word, and the files of these whose names match. A word that begins
+# with the home as ~ is completed with it.
 function __orvpatch_paths
     set -l word (commandline -ct)
     __fish_complete_directories $word ''
-    for path in (string unescape -- $word)*
+    set -l begun (string unescape -- $word)
+    set -l home ''
+    if string match -q '~/*' -- $word
+        set home $HOME
+        set begun $HOME(string sub -s 2 -- $begun)
+    end
+    for path in $begun*
         test -f $path
         and string match -rq -- $argv[1] (string replace -r '.*/' '' -- $path)
-        and echo $path
+        or continue
+        if test -n "$home"
+            set path '~'(string sub -s (math (string length -- $home) + 1) -- $path)
+        end
+        echo $path
     end
 end
 

@@ -1,5 +1,6 @@
 """The completions, asked in the shells themselves."""
 
+import os
 import shlex
 import subprocess
 from pathlib import Path
@@ -29,6 +30,11 @@ CASES = {
     "no second action after an install": ("orvpatch -i x -", {"-h"}),
     "no second action after a report": ("orvpatch -t x -", {"-h"}),
     "no second action after a validation": ("orvpatch -vi x -", {"-h"}),
+    "report: below the own home": ("orvpatch -t ~/", PATCHES | FOLDERS),
+    "report: begun below the own home": ("orvpatch -t ~/kq", {"kqa_lpp266_vems_fp0001.tar"}),
+    "report: deep below the own home": ("orvpatch -t ~/patches/", {"kzt_unix_vecm_fp01.tar"}),
+    "home: below the own home": ("orvpatch -h ~/ho", {"ho me", "home"}),
+    "validation: below the own home": ("orvpatch -vi ~/", {"patch.ini"} | FOLDERS),
     "nothing after both": ("orvpatch -h home -i x -", set()),
 }
 
@@ -44,7 +50,7 @@ def folder(tmp_path_factory):
 
 
 def ask(words, folder):
-    done = subprocess.run(words, cwd=folder, stdin=subprocess.DEVNULL, capture_output=True, text=True, timeout=30)
+    done = subprocess.run(words, cwd=folder, env={**os.environ, "HOME": str(folder)}, stdin=subprocess.DEVNULL, capture_output=True, text=True, timeout=30)
     assert done.stderr == ""
     return done.stdout.splitlines()
 
@@ -76,6 +82,17 @@ def test_offers_what_fits(shell, case, folder):
     line, names = CASES[case]
     offered = shell(line, folder)
     assert sorted({offer.rstrip("/").rpartition("/")[2] for offer in offered}) == sorted(names)
+
+
+@pytest.mark.parametrize("shell", [bash, fish], ids=lambda shell: shell.__name__)
+def test_the_own_home_stays_as_it_was_typed(shell, folder):
+    assert shell("orvpatch -t ~/kq", folder) == ["~/kqa_lpp266_vems_fp0001.tar"]
+
+
+@pytest.mark.parametrize("home", ["$HOME", "${HOME}"])
+def test_bash_replaces_the_variable_of_the_home(home, folder):
+    assert bash(f"orvpatch -t {home}/kq", folder) == [f"{folder}/kqa_lpp266_vems_fp0001.tar"]
+    assert set(bash(f"orvpatch -h {home}/ho", folder)) == {f"{folder}/home", f"{folder}/ho me"}
 
 
 @pytest.mark.parametrize("shell", [bash, fish], ids=lambda shell: shell.__name__)
