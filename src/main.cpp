@@ -128,7 +128,7 @@ int validatePatchFile(const std::string &path) {
   return 0;
 }
 
-// KEEP(utest-success): what the self-check finds is printed, but the form always ends with success.
+// KEEP(utest-success): findings of the self-check are printed, but the form always ends with success.
 void unit_test() {
   patchProcessorSelfCheck();
 }
@@ -141,7 +141,7 @@ int runAction(const Arguments &arguments) {
   return validatePatchFile(arguments.path);
 }
 
-/// Logs and prints how the run ended; returns the exit status.
+/// Logs and prints the verdict; returns the exit status.
 int reportVerdict(int status) {
   const std::string logDirectory = Util::getQuillHome() + "patchlogs/";
   const std::string verdict = status == 0
@@ -154,10 +154,9 @@ int reportVerdict(int status) {
   return status;
 }
 
-/// What a caller may have left in a state that this process must not work in: an ignored SIGCHLD would take
-/// away the children's exit statuses, and a closed standard descriptor would be given to the next file that
-/// is opened. And a reader that goes away, or a limit on the size of files, must not end an installation in
-/// its middle.
+/// Corrects state that the caller may have left: with SIGCHLD ignored the children have no exit statuses, and
+/// a closed standard descriptor would be given to the next file that is opened. A closed reader, or a limit
+/// on the size of files, must not end an installation in its middle.
 void repairInheritedState() {
   static_cast<void>(signal(SIGCHLD, SIG_DFL));
   ignoreWriteSignals();

@@ -12,14 +12,14 @@ const std::string ORVComponent::DEFAULT_INSTANCE;
 
 namespace {
 
-/// Fields of a line of the run information; what follows them is not used.
+/// Fields of a line of the run information; further ones are not used.
 enum RunInfoField { HostField, CodeField, PidField, InstanceField, UnusedField, FieldCount };
 
 bool beginsWith(const std::string &text, const std::string &prefix) {
   return text.rfind(prefix, 0) == 0;
 }
 
-/// The instance name as the control scripts know it.
+/// The instance name as the control scripts expect it.
 std::string instanceName(const std::string &code, std::string instance) {
   const std::size_t underscore = instance.find('_');
   if (code == "xe" && underscore != std::string::npos) {
@@ -29,7 +29,7 @@ std::string instanceName(const std::string &code, std::string instance) {
   return instance == "None" ? ORVComponent::DEFAULT_INSTANCE : instance;
 }
 
-/// The owner of a process as `ps` shows it; empty when it cannot be found out.
+/// The owner of a process as `ps` shows it; empty when unknown.
 std::string ownerOf(const std::string &pid) {
   CommandResult ps;
   if (!runCommand({"/bin/sh", "-c", "ps -ef | grep -v grep | grep " + pid}, ps)) {
@@ -50,8 +50,8 @@ bool isRunning(const std::string &pid, std::string &owner) {
     LOG_TRACE("unable to running command");
     return false;
   }
-  // KEEP(pid-substring): the id is looked for anywhere in the output, so "12" is found in "123", and no id at
-  // all everywhere: an instance without a process id counts as running.
+  // KEEP(pid-substring): the id is searched for anywhere in the output, so "12" is found in "123", and an
+  // empty id in any output: an instance without a process id counts as running.
   if (ps.out.find(pid) == std::string::npos)
     return false;
   owner = ownerOf(pid);
@@ -104,8 +104,8 @@ void ORVComponent::readRunInfoLine(const std::string &line, const std::string &s
     LOG_TRACE("Invalid line format: %s", line.c_str());
     return;
   }
-  // KEEP(host-prefix): the host of the line may go on behind the local name, as it does with a domain; that a
-  // host1 accepts the lines of a host12 too is the price.
+  // KEEP(host-prefix): more may follow the local name in the host of the line, such as a domain; so host1
+  // also accepts the lines of host12.
   if (!beginsWith(Util::toLower(fields[HostField]), hostName) || "k" + fields[CodeField] != name_)
     return;
   const std::string instance = instanceName(fields[CodeField], fields[InstanceField]);
@@ -258,7 +258,7 @@ bool UNIXMonitoringServer::startInstance(const std::string &instance, PatchError
 }
 
 // KEEP(server-stop-unchecked): unlike for an agent, a failing script is a failure whether or not the process
-// has gone: a server counts as stopped on its script's word alone.
+// has gone: only its script decides whether a server is stopped.
 bool UNIXMonitoringServer::stopInstance(const std::string &instance, PatchError *err) {
   LOG_TRACE("stopInstance(%s) %s", instance.c_str(), "entry");
   static const ControlFailure failure = {PatchError::ServerInstanceFailed, "ERROR_STOP_SRV_INST",

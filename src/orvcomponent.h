@@ -1,8 +1,7 @@
-// An installed component: what it is, which of its instances run on this host, how one is started and
-// stopped.
+// An installed component: its identity, its running instances on this host, and how to start and stop one.
 //
 // The running instances are read from the run information once, at construction; starts and stops of this run
-// keep the list up to date. The control scripts are the product's own, under bin/ of the home.
+// update the list. The control scripts belong to the product, under bin/ of the home.
 #pragma once
 
 #include <map>
@@ -51,8 +50,8 @@ public:
   Version *getVersion() const { return version_.get(); } ///< owned by the component
   std::vector<std::string> getActiveInstances() const { return activeInstances_; }
   std::vector<std::string> getPrereqs() const { return prereqs_; }
-  /// Process id of an active instance as the run information holds it, and the owner whom `ps` named; empty
-  /// for an instance that was not found running.
+  /// Process id of an active instance from the run information, and its owner from `ps`; empty for an
+  /// instance that was not found running.
   std::string getPid(const std::string &instance) const { return lookUp(pids_, instance); }
   std::string getOwner(const std::string &instance) const { return lookUp(owners_, instance); }
 
@@ -65,8 +64,8 @@ protected:
     const char *defaultKey;
   };
 
-  /// Runs a control command and traces what it returned; true for exit status 0. `ran`, when given, tells
-  /// whether it could be run at all.
+  /// Runs a control command and traces its results; true for exit status 0. `ran`, when given, is false if it
+  /// could not be run.
   bool runControl(const std::vector<std::string> &command, bool *ran = nullptr) const;
   /// Fills the record and logs, unless the record is null; always false.
   bool reportControlFailure(const ControlFailure &failure, const std::string &instance, bool named,

@@ -21,14 +21,14 @@ bool beginsWith(const std::string &text, const char *prefix) {
   return text.rfind(prefix, 0) == 0;
 }
 
-/// What the lines of a version file say.
+/// The content of a version file.
 struct VersionFile {
   std::string desc;
   std::string vrmf;
   std::vector<std::string> prereqs;
 };
 
-/// What follows the first "=", trimmed; the whole line, trimmed, when it has none.
+/// The text after the first "=", trimmed; the whole line, trimmed, when it has none.
 std::string valueOf(const std::string &line) {
   std::string value = line.substr(line.find('=') + 1);
   Util::trimString(value);
@@ -56,7 +56,7 @@ void addPrereq(const std::string &line, std::vector<std::string> &prereqs) {
 VersionFile parseVersionFile(const std::vector<std::string> &lines) {
   VersionFile content;
   for (const std::string &line : lines) {
-    // KEEP(key-prefix): a key is whatever the line begins with, so "description" counts as "desc".
+    // KEEP(key-prefix): a key is compared with the beginning of the line, so "description" counts as "desc".
     if (beginsWith(line, "desc"))
       content.desc = valueOf(line);
     else if (beginsWith(line, "VRMF"))

@@ -11,7 +11,7 @@
 
 class ORVComponentRegistry {
 public:
-  /// The single instance, made on the first call, which does all the reading. It lives to the end of the
+  /// The single instance, made and filled on the first call. It lives to the end of the
   /// process unless it is deleted; the next call then builds a new one.
   static ORVComponentRegistry *getInstance();
 
@@ -31,7 +31,7 @@ public:
 
   /// Adds a component for every qualifying version file.
   void buildComponents();
-  /// Adds the component of one version file, unless that is unreadable or has no VRMF.
+  /// Adds the component of one version file, unless the file is unreadable or has no VRMF.
   void buildComponent(const std::string &path, const std::string &cinfo);
 
 private:

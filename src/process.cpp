@@ -18,7 +18,7 @@ namespace {
 
 enum PipeEnd { ReadEnd = 0, WriteEnd = 1 };
 
-/// The two pipes of one child; what is still open at the end is closed.
+/// The two pipes of one child; ends that are still open are closed by the destructor.
 struct Pipes {
   int out[2] = {-1, -1};
   int err[2] = {-1, -1};
@@ -40,31 +40,31 @@ struct Pipes {
   }
 };
 
-/// What a child may say before it is waited for: with this size, which the system gives to root, a tar that
-/// warns of every member of a large archive still ends. An ordinary user is mostly given 1 MiB.
+/// Output that a child can print before it is read: with this size, which the system gives root, a tar that
+/// warns of every member of a large archive still ends. Other users mostly get 1 MiB.
 constexpr int LargestPipe = 16 * 1024 * 1024;
 /// The size of a new pipe, with pages of 4 KiB.
 constexpr int UsualPipe = 64 * 1024;
 
-/// Lets a pipe hold as much as the system gives. A refusal leaves it as it was.
+/// Makes a pipe as large as the system allows. A refusal leaves it as it was.
 void enlarge(int end) {
   for (int size = LargestPipe; size > UsualPipe && fcntl(end, F_SETPIPE_SZ, size) < 0; size /= 2) {
   }
 }
 
-/// False, with both ends -1 and the reason in errno, when there is no pipe to be had.
+/// False, with both ends -1 and the reason in errno, when no pipe can be made.
 bool makePipe(int *ends) {
   ends[ReadEnd] = ends[WriteEnd] = -1;
   if (pipe(ends) != 0)
     return false;
   enlarge(ends[WriteEnd]);
-  // The child has ended before its output is read, so all of it is in the pipe. A program that it left behind
-  // may still hold the other end: an empty pipe then means no output, and is not to be waited on.
+  // The child has ended before its output is read, so all of it is in the pipe. A program that it left
+  // running may still hold the other end: an empty pipe then means no output, and must not be waited for.
   static_cast<void>(fcntl(ends[ReadEnd], F_SETFL, O_NONBLOCK));
   return true;
 }
 
-/// What whoever started this process wants to become of SIGPIPE.
+/// The caller's disposition of SIGPIPE.
 void (*callersPipeSignal)(int) = SIG_DFL;
 
 [[noreturn]] void runChild(char **argv, Pipes &pipes) {
@@ -80,9 +80,8 @@ void (*callersPipeSignal)(int) = SIG_DFL;
   exit(error);
 }
 
-/// Waits for the end of this child; false, with a line in the log, when the system does not tell of it. A
-/// shell that has replaced itself by this program leaves it its own children: their ends are taken and
-/// forgotten.
+/// Waits for the end of this child; false, with a line in the log, when the system reports none. Other
+/// children, left by a shell that has replaced itself by this program, are reaped and forgotten.
 bool waitFor(pid_t child, int *status) {
   pid_t ended = 0;
   do
@@ -137,7 +136,8 @@ bool runCommand(char **argv, int *rc, std::string *out, std::string *err) {
   Pipes pipes;
   static_cast<void>(createPipes(pipes.out, pipes.err));
 
-  // A child that cannot execute its program ends with exit(), which would write once more what is buffered.
+  // A child that cannot execute its program ends with exit(), which would write buffered output a second
+  // time.
   fflush(stdout);
   fflush(stderr);
   const pid_t child = fork();

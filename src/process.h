@@ -12,13 +12,13 @@
 ///
 /// rc   receives the exit status, 0 to 255; 0 for a child killed by a signal, and the error number for a
 ///      program that cannot be executed; may be null
-/// out  what the child wrote to standard output is appended; null prints it on this process's own
+/// out  receives the child's standard output, appended; null prints it on this process's own
 /// err  the same for standard error
 ///
 /// True when the child was started and waited for, whatever its exit status; false when it was not.
 bool runCommand(char **argv, int *rc, std::string *out, std::string *err);
 
-/// What a command left behind.
+/// Exit status and output of a command.
 struct CommandResult {
   int rc = 0;
   std::string out;
@@ -28,12 +28,11 @@ struct CommandResult {
 /// The same for a command given as its words, with both streams captured.
 bool runCommand(const std::vector<std::string> &words, CommandResult &result);
 
-/// Ignores the signals that a write may raise, for a log that nobody takes ends no run. Children get SIGPIPE
+/// Ignores the signals that a write may raise: a closed reader of the log ends no run. Children get SIGPIPE
 /// as the caller of this process has it. SIGXFSZ stays ignored for them: a child that reaches the limit on
-/// the size of files can then end with a status of its own, where one that a signal ends would count as a
-/// success.
+/// the size of files then ends with its own status, where one that a signal ends would count as a success.
 void ignoreWriteSignals();
 
-/// Makes the two pipes, read end first. A pipe that cannot be made is logged and its ends are -1; the result
-/// is true all the same.
+/// Makes the two pipes, read end first. If a pipe cannot be made, this is logged, its ends are -1, and the
+/// result is still true.
 bool createPipes(int *outPipe, int *errPipe);

@@ -26,7 +26,7 @@ namespace {
 /// The status of a process that ends for want of memory.
 enum ExitStatus { OutOfMemory = 71 };
 
-/// Fills `buffer` as far as the file goes; the number of bytes read, or -1 with the reason in errno.
+/// Fills `buffer` up to the end of the file; the number of bytes read, or -1 with the reason in errno.
 ssize_t readUpTo(const FileDescriptor &file, char *buffer, std::size_t size) {
   std::size_t filled = 0;
   while (filled < size) {
@@ -55,7 +55,7 @@ int readContent(const FileDescriptor &file, const char *name, char **buffer) {
   }
   const ssize_t count = readUpTo(file, content.get(), capacity);
   if (count < 0)
-    return errno; // a part of a file is not the file: nobody is to write it back
+    return errno; // a part of a file is not the file, and must not be written back
   content.get()[count] = '\0';
   *buffer = content.release();
   return 0;
@@ -200,8 +200,8 @@ int Util::readFileByLines(const char *name, std::vector<std::string> &lines) {
 }
 
 void Util::setEnvironment(const std::string &name, const std::string &value) {
-  // The environment keeps pointing at the strings, to the very end of the process, so they are never
-  // released; kept here, those that a later one has replaced stay reachable for whoever looks for leaks.
+  // The environment points at the strings to the end of the process, so they are never released; kept here,
+  // replaced ones stay reachable for leak checkers.
   static auto *const strings = new std::deque<std::string>;
   strings->push_back(name + "=" + value);
   // Its only failure is want of memory, and with the old home or search path the wrong files would be used.

@@ -18,13 +18,13 @@ public:
 
   /// Removes carriage returns, line feeds, tabs and blanks at both ends, in place.
   static void trimString(std::string &s);
-  /// The non-empty pieces of `s` between any of the delimiter characters; what follows a NUL does not count.
+  /// The non-empty pieces of `s` between any of the delimiter characters; text after a NUL is ignored.
   static std::vector<std::string> tokenizeString(const std::string &s, const char *delimiters);
   /// Replaces the first "/./" by "/".
   static std::string removeDotFromPath(const std::string &path);
   /// `s` with its letters in lower case, byte by byte.
   static std::string toLower(const std::string &s);
-  /// A product code as the tool keeps it: lower case, and "k" before a two-letter code.
+  /// Normalised product code: lower case, and "k" before a two-letter code.
   static std::string normalizeProductCode(const std::string &code);
 
   /// Whether `path` is accessible; two trace lines, and one more when it is not.
@@ -53,6 +53,6 @@ public:
   static bool isVEMSInstalled();                 ///< monitoring server
   static bool isVEPSInstalled(std::string arch); ///< portal server
   static bool isVEPDInstalled(std::string arch); ///< portal desktop client
-  /// Whether the management console runs; false on any doubt.
+  /// Whether the management console runs; false on any failure.
   static bool isManageGUIRunning();
 };
