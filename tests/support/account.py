@@ -1,4 +1,4 @@
-"""An account beside root's that may log in: agents run under it and `su` switches to it."""
+"""A second account, with a shell: agents run under it and `su` switches to it."""
 
 import contextlib
 import os

@@ -1,4 +1,4 @@
-"""A product home with live processes, as the program finds it on a customer's machine."""
+"""A product home with live processes, like one on a customer's machine."""
 
 import atexit
 import os
@@ -74,7 +74,7 @@ class ProductHome:
         return home
 
     def detach(self):
-        """Lets the home's processes live on when this process ends; `attach` finds them again."""
+        """Leaves the home's processes running when this process ends; `attach` finds them again."""
         atexit.unregister(self.close)
 
     def __enter__(self):
@@ -140,14 +140,14 @@ class ProductHome:
         return self.write(f"registry/{filename or f'{code}{arch}.ver'}", "".join(f"{line}\n" for line in lines))
 
     def level(self, code, arch="lpp266", *, filename=None):
-        """The VRMF that the version file holds now."""
+        """The current VRMF of the version file."""
         text = self.read(f"registry/{filename or f'{code}{arch}.ver'}").decode()
         return next(line.split("=", 1)[1].strip() for line in text.splitlines() if line.startswith("VRMF"))
 
     # --- running instances -----------------------------------------------------------------------------
 
     def start(self, code, instance="", user=None):
-        """Starts an instance as an operator would, by the product's own script, without a journal line."""
+        """Starts an instance by the product's own script, like an operator, without a journal line."""
         self._control("start", code, instance, user)
 
     def stop(self, code, instance="", user=None):
@@ -169,12 +169,12 @@ class ProductHome:
         return self.process("classes/wbt.jar")
 
     def kill(self, pid):
-        """Kills a process of this home and waits until it is gone from the process table."""
+        """Kills a process of this home and waits until it has left the process table."""
         os.kill(pid, signal.SIGKILL)
         _await_end(pid)
 
     def add_row(self, code, pid, instance="None", host=None, rest="sample"):
-        """Adds a row to the run information, true or not."""
+        """Adds a row to the run information, whether the process exists or not."""
         fields = [host or os.uname().nodename, code, str(pid), instance, rest]
         self.run_info += self._separator().join(fields) + "\n"
 
@@ -215,7 +215,7 @@ class ProductHome:
     # --- what has happened -----------------------------------------------------------------------------
 
     def watch(self, *paths):
-        """Every journal entry from now on keeps the content that these files have at its moment."""
+        """Every later journal entry keeps the content of these files at that moment."""
         with open(self.path / "control/watch", "a", encoding="utf-8") as watched:
             watched.writelines(f"{path}\n" for path in paths)
 
@@ -244,7 +244,7 @@ class ProductHome:
         """Ends every process that was ever started in this home."""
         if not self.exists("control/started"):
             return
-        # Keepers are left alone: each ends as soon as it has reaped its process.
+        # Keepers are not killed: each ends as soon as it has reaped its process.
         pids = [int(line.split()[0]) for line in self.read("control/started").splitlines()]
         living = [pid for pid in pids if self._is_ours(pid)]
         for pid in living:
@@ -298,7 +298,7 @@ class ProductHome:
         return Call(program, tuple(args), user, cwd, path, quillhome, seen)
 
     def _is_ours(self, pid):
-        """Whether this process still is one of this home: a process id may have been given out again."""
+        """Whether this process is still one of this home: process ids are reused."""
         try:
             command = Path(f"/proc/{pid}/cmdline").read_bytes()
         except OSError:

@@ -36,7 +36,7 @@ class Program:
         self.binary = Path(named).absolute()
         self._copy = None
         self.runner = shlex.split(os.environ.get("ORVPATCH_RUNNER", "")) if runner is None else list(runner)
-        # Found now: a test may give the program a search path on which the runner is not.
+        # Found now: a test may give the program a search path without the runner.
         self.runner[:1] = [shutil.which(word) or word for word in self.runner[:1]]
 
     @property

@@ -40,7 +40,7 @@ class Sample:
         return ProductHome.attach(self.root / "home")
 
     def instances(self):
-        """What runs now, one text each, as the program words it, with the process id at the end."""
+        """The running instances, in the program's words, with the process id at the end."""
         return [
             f"{f'{row.name} instance of ' if row.name else ''}{_COMPONENTS[row.code]}, pid {row.pid}"
             for row in sorted(self.home.rows()) if (row.code, row.name) in self.home.instances()

@@ -69,7 +69,7 @@ LogLine error(const std::string &component, const std::string &message);
 /// The lines of an operation: its entry, what it logs between, its exit.
 LogLines framed(const LogLine &entry, const LogLines &between, const LogLine &exit);
 
-/// The lines with every pointer value written as "(buffer)": where a buffer lies cannot be foretold.
+/// The lines with every pointer value written as "(buffer)", since addresses vary.
 LogLines withoutPointers(LogLines lines);
 
 /// What is at `path` itself, without following a link.
@@ -82,7 +82,7 @@ bool sameFile(const std::string &a, const std::string &b);
 /// The number of descriptors that this process has open.
 std::size_t openDescriptors();
 
-/// Another file creation mask for the time of a scope.
+/// Another file creation mask during a scope.
 class UmaskScope {
 public:
   explicit UmaskScope(mode_t mask);

@@ -1,4 +1,4 @@
-"""Snapshots of a directory tree, to tell what a run has changed and what it has left alone."""
+"""Snapshots of a directory tree, to compare the state before and after a run."""
 
 import hashlib
 import os

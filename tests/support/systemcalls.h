@@ -1,5 +1,5 @@
-// Stand-ins for system calls, in the test program that wrapped.cmake links with them. Each writes the call
-// down and passes it on to the system, unless a test has told it to fail.
+// Replacements for system calls, in the test program that wrapped.cmake links with them. Each records the
+// call and passes it on to the system, unless a test makes it fail.
 #pragma once
 
 #include <cstddef>
@@ -51,10 +51,10 @@ void failAllocationOf(std::size_t size);
 void limitTransfers(std::size_t bytes);
 /// Lets reads find the end of the file after so many bytes in all.
 void endReadsAfter(std::size_t bytes);
-/// What getuid and uname answer.
+/// Results of getuid and uname.
 void answerUser(uid_t user);
 void answerNodeName(const std::string &name);
-/// Every call does again what the system does; what was written down is forgotten.
+/// Restores the system's behaviour of every call and forgets the recorded calls.
 void restoreSystemCalls();
 
 /// The names of the calls since the last restoring, in order, as far as they are among these.

@@ -1,4 +1,4 @@
-"""The demo: what it announces, the shell at its end, and what is left of it."""
+"""The demo: its announcements, the shell at its end, and that nothing is left of it."""
 
 import os
 import re

@@ -11,7 +11,7 @@ _SETUP = Path(__file__).resolve().parents[2] / "scripts/setup"
 
 
 class Machine:
-    """A machine as the script sees it: all packages are installed but those named in the file `lacking`."""
+    """A machine for the script: all packages are installed but those named in the file `lacking`."""
 
     def __init__(self, folder, apt_get, user=0, sudo='exec "$@"'):
         self.lacking, self.calls = folder / "lacking", folder / "calls"

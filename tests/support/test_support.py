@@ -1,4 +1,4 @@
-"""The sample product and the patch builder do what the tests that use them take for granted."""
+"""The sample product and the patch builder work as other tests assume."""
 
 import os
 import pwd

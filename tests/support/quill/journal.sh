@@ -1,13 +1,13 @@
 # Sourced by the sample product's control scripts and by the scripts of sample patches. The caller sets
 # quill_home, the home without a trailing "/".
 
-# An account that only the program under test knows has no name here.
+# An account in a private view of /etc/passwd has no name here.
 user_name() { id -un 2>/dev/null || true; }
 
 # journal PROGRAM ARGUMENT...
 # Appends one line to the home's journal: program, user, directory, PATH, QUILLHOME, arguments, separated by
-# the unit separator, which occurs in none of them. Saves a copy of every watched file beside it, so that
-# a reader can tell what was in place at the moment of the call.
+# the unit separator, which occurs in none of them. Saves a copy of every watched file as it is at the moment
+# of the call.
 journal() {
   [ -z "${QUILL_UNJOURNALED-}" ] || return 0
   us=$(printf '\037')

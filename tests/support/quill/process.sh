@@ -1,5 +1,5 @@
 # Sourced by QuillAgent and QuillServer: starts and stops the process of one instance and keeps the run
-# information true. The caller sets quill_home, the home without a trailing "/".
+# information up to date. The caller sets quill_home, the home without a trailing "/".
 
 run_info="$quill_home/config/.ConfigData/RunInfo"
 
@@ -84,7 +84,7 @@ await_end() { # PID
   done
 }
 
-# switch_of VERB CODE INSTANCE: the folder under control/ that tells how this call shall behave, if any.
+# switch_of VERB CODE INSTANCE: the folder under control/ with the behaviour of this call, if any.
 switch_of() {
   named="$quill_home/control/$1-$2-$(printf %s "${3:-None}" | tr / _)"
   if [ -d "$named" ]; then
@@ -94,7 +94,7 @@ switch_of() {
   fi
 }
 
-# perform VERB CODE INSTANCE: does what was asked for, or what a switch has ordered instead.
+# perform VERB CODE INSTANCE: starts or stops the instance, or does what a switch orders instead.
 perform() {
   switch=$(switch_of "$@")
   if [ -z "$switch" ]; then
