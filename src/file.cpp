@@ -8,7 +8,10 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "heldfile.h"
 #include "logger.h"
+#include "newdirectories.h"
+#include "symboliclinks.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "file.cpp"
@@ -39,15 +42,27 @@ struct Attributes {
   gid_t group = static_cast<gid_t>(-1);
 };
 
-/// Removes what stands at the target and returns the attributes that the new file inherits from it. A stat
-/// alone answers whether anything is there, in one call for each file of a patch; only when it fails for
-/// another reason is the existence asked for.
+/// The attributes of what stands at the target, in one call for each file of a patch. A link is followed, but
+/// the set-id bits of what it leads to are not for the new file: whoever made the link chose them.
+bool lookUp(const std::string &target, Attributes &attributes) {
+  struct stat status = {};
+  if (lstat(target.c_str(), &status) != 0)
+    return false;
+  mode_t inherited = 07777;
+  if (S_ISLNK(status.st_mode)) {
+    inherited = 01777;
+    if (stat(target.c_str(), &status) != 0)
+      return false;
+  }
+  attributes = {status.st_mode & inherited, status.st_uid, status.st_gid};
+  return true;
+}
+
+/// Removes what stands at the target and returns the attributes that the new file inherits from it. Only when
+/// they cannot be looked up for another reason than its absence is the existence asked for.
 Attributes clearTarget(const std::string &target) {
   Attributes attributes;
-  struct stat status = {};
-  if (stat(target.c_str(), &status) == 0) {
-    attributes = {status.st_mode & 07777, status.st_uid, status.st_gid};
-  } else {
+  if (!lookUp(target, attributes)) {
     const int error = errno;
     if (error == ENOENT || !isAccessible(target))
       return attributes;
@@ -59,15 +74,28 @@ Attributes clearTarget(const std::string &target) {
   return attributes;
 }
 
-/// Makes one directory with all permissions, whatever the umask.
-bool makeOpenDirectory(const std::string &path) {
+/// What became of owner and mode: an error number, or 0. The mode follows the owner, and only when that could
+/// be set: a change of owner takes set-id bits away.
+struct Outcome {
+  int owner = 0;
+  int mode = 0;
+};
+
+Outcome setAttributes(const HeldFile &file, const Attributes &attributes) {
+  if (!file.setOwner(attributes.owner, attributes.group))
+    return {errno, 0};
+  return {0, file.setMode(attributes.mode) ? 0 : errno};
+}
+
+Outcome setAttributes(const std::string &path, const Attributes &attributes) {
+  if (chown(path.c_str(), attributes.owner, attributes.group) != 0)
+    return {errno, 0};
+  return {0, chmod(path.c_str(), attributes.mode) == 0 ? 0 : errno};
+}
+
+bool makeDirectory(const std::string &path, NewDirectories &made) {
   LOG_TRACE("creating dir: %s", path.c_str());
-  if (mkdir(path.c_str(), 0777) != 0)
-    return false;
-  struct stat status = {};
-  if (stat(path.c_str(), &status) == 0)
-    static_cast<void>(chmod(path.c_str(), (status.st_mode & 07777) | 0777));
-  return true;
+  return made.make(path);
 }
 
 /// Whether the directory's own name, without the "/" at its end, is a symbolic link.
@@ -118,8 +146,8 @@ File::File(const File &directory, const std::string &name) : path_(directory.pat
 
 File::File(const File &other)
     : path_(other.path_), exists_(other.exists_), isFile_(other.isFile_), isDirectory_(other.isDirectory_),
-      lastModification_(other.lastModification_), size_(other.size_), files_(copyOf(other.files_)),
-      subDirectories_(copyOf(other.subDirectories_)) {}
+      isRegular_(other.isRegular_), lastModification_(other.lastModification_), size_(other.size_),
+      files_(copyOf(other.files_)), subDirectories_(copyOf(other.subDirectories_)) {}
 
 void File::initialize() {
   lastModification_ = 0;
@@ -136,11 +164,12 @@ void File::initialize() {
     const int error = errno;
     if (error != ENOENT && error != ENOTDIR)
       LOG_ERROR("Unable to determine file/directory for path: %s. %s", path_.c_str(), strerror(error));
-    exists_ = isFile_ = isDirectory_ = false;
+    exists_ = isFile_ = isDirectory_ = isRegular_ = false;
     return;
   }
   isDirectory_ = S_ISDIR(status.st_mode);
   isFile_ = !isDirectory_;
+  isRegular_ = S_ISREG(status.st_mode);
   // What can be looked at is accessible too, unless the "/" that was left out asks for a directory. A call of
   // access for each snapshot would only repeat that, at a twentieth of a large installation's time.
   exists_ = isDirectory_ || !slash;
@@ -208,28 +237,41 @@ int File::moveTo(const std::string &target, bool overwrite) {
     LOG_TRACE("%s does not exist or is not a file", path_.c_str());
     return 0;
   }
+  // Opened before anything changes: owner and mode reach this file, whatever another user puts in the place
+  // of its name meanwhile.
+  const HeldFile source(path_, isRegular_ ? HeldFile::Kind::Regular : HeldFile::Kind::Other);
   const Attributes attributes = overwrite ? clearTarget(target) : Attributes();
+  Outcome outcome;
+  // Without a descriptor to be had the name in the temporary directory is the safest one.
+  if (!source.isHeld() && !source.isLink())
+    outcome = setAttributes(path_, attributes);
+  const int error = linkAndUnlink(target);
+  if (error != 0)
+    return error;
+  path_ = target;
+  if (source.isHeld())
+    outcome = setAttributes(source, attributes);
+  else if (source.isLink()) // a link is moved itself, and leads on from its new place
+    outcome = setAttributes(target, attributes);
+  // KEEP(chmod-ignored): a wrong mode, unlike a wrong owner, leaves the move a success.
+  if (outcome.owner != 0)
+    LOG_TRACE("unable to chown for file: %s", target.c_str());
+  else if (outcome.mode != 0)
+    LOG_TRACE("unable to chmod for file: %s", target.c_str());
+  return outcome.owner;
+}
+
+/// Gives the file its second name and takes the first one away; 0 or an error number.
+int File::linkAndUnlink(const std::string &target) const {
   int error = 0;
   if (link(path_.c_str(), target.c_str()) != 0) {
     error = errno;
     LOG_TRACE("unable to link: %s to %s. %s", path_.c_str(), target.c_str(), strerror(error));
-    return error;
-  }
-  if (unlink(path_.c_str()) != 0) {
+  } else if (unlink(path_.c_str()) != 0) {
     error = errno;
     LOG_TRACE("unable to unlink: %s. %s", path_.c_str(), strerror(error));
-    return error;
   }
-  path_ = target;
-  if (chown(target.c_str(), attributes.owner, attributes.group) != 0) {
-    error = errno;
-    LOG_TRACE("unable to chown for file: %s", target.c_str());
-    return error;
-  }
-  // KEEP(chmod-ignored): a wrong mode, unlike a wrong owner, leaves the move a success.
-  if (chmod(target.c_str(), attributes.mode) != 0)
-    LOG_TRACE("unable to chmod for file: %s", target.c_str());
-  return 0;
+  return error;
 }
 
 bool File::copyFile(const std::string &target, bool keepExisting) {
@@ -262,8 +304,13 @@ bool File::linkTo(const std::string &target, bool keepExisting) const {
 }
 
 bool File::mkdir() {
+  NewDirectories made;
+  return mkdir(made);
+}
+
+bool File::mkdir(NewDirectories &made) {
   LOG_TRACE("File::mkdir %s", "entry");
-  if (makeMissingDirectories()) {
+  if (makeMissingDirectories(made)) {
     if (!endsInSlash(path_))
       path_ += '/';
     isDirectory_ = true;
@@ -275,17 +322,24 @@ bool File::mkdir() {
   return exists_;
 }
 
-bool File::makeMissingDirectories() const {
+bool File::makeMissingDirectories(NewDirectories &made) const {
+  const std::vector<std::string> components = Util::tokenizeString(path_, "/");
   std::vector<std::string> prefixes;
   std::string prefix = isAbsolute() ? "/" : "";
-  for (const std::string &component : Util::tokenizeString(path_, "/")) {
+  for (const std::string &component : components) {
     prefix += component + "/";
     prefixes.push_back(prefix);
   }
   // What is accessible has accessible ancestors: looking from the end asks once for most directories, where
   // looking from the start would ask for every ancestor of each directory of a deep tree again.
   const auto missing = std::find_if(prefixes.rbegin(), prefixes.rend(), isAccessible).base();
-  return std::all_of(missing, prefixes.end(), makeOpenDirectory);
+  // What was missing may be there once the directories before it are made, behind "." and ".." alone.
+  bool isNew = true;
+  return std::all_of(missing, prefixes.end(), [&](const std::string &path) {
+    const std::string &component = components[static_cast<std::size_t>(&path - prefixes.data())];
+    isNew = isNew && component != "." && component != "..";
+    return (!isNew && isAccessible(path)) || makeDirectory(path, made);
+  });
 }
 
 bool File::rmdir() {
@@ -297,6 +351,8 @@ bool File::rmdir() {
   const bool removed = recursiveDelete(this);
   if (removed)
     exists_ = false;
+  else
+    removeSymbolicLinks(path_);
   LOG_TRACE("File::rmdir =%d", removed);
   return removed;
 }

@@ -14,6 +14,8 @@
 
 #include "ownedlist.h"
 
+class NewDirectories;
+
 class File {
 public:
   explicit File(const std::string &path);
@@ -50,16 +52,19 @@ public:
   /// Unlinks an existing file; true exactly when that succeeded. Afterwards exists() is inverted.
   bool deleteFile();
   /// Links the file to `target` and unlinks the source. A target that exists is replaced when `overwrite` is
-  /// true, and its owner, group and permission mode are kept; any other new file gets mode 0755. A source
-  /// that is not there counts as moved. Afterwards the path is the target's and the flags are those of
-  /// before.
+  /// true, and its owner, group and permission mode are kept (of what a link leads to, not the set-id bits);
+  /// any other new file gets mode 0755. A source that is not there counts as moved. Afterwards the path is
+  /// the target's and the flags are those of before.
   bool moveFile(const std::string &target, bool overwrite);
   /// Links the file to `target` too. With `keepExisting` an existing target makes it fail.
   bool copyFile(const std::string &target, bool keepExisting);
   /// Makes the directory and its missing parents, each with mode 0777 whatever the umask. True when the
   /// object exists in the end, as far as it knows.
   bool mkdir();
-  /// Removes the directory and everything below it. Never follows a symbolic link.
+  /// The same, but what is made stays closed to other users until `made` goes.
+  bool mkdir(NewDirectories &made);
+  /// Removes the directory and everything below it. Never follows a symbolic link; where anything stays, all
+  /// links of the tree go even so.
   bool rmdir();
 
   /// Entries that are not directories, in the order of the system; loaded once, owned by this object.
@@ -71,14 +76,16 @@ public:
 
 private:
   int moveTo(const std::string &target, bool overwrite);
+  int linkAndUnlink(const std::string &target) const;
   bool linkTo(const std::string &target, bool keepExisting) const;
-  bool makeMissingDirectories() const;
+  bool makeMissingDirectories(NewDirectories &made) const;
   void appendEntry(const std::string &name);
 
   std::string path_;
   bool exists_ = false;
   bool isFile_ = false;
   bool isDirectory_ = false;
+  bool isRegular_ = false; ///< neither a directory nor a device, pipe or socket
   std::int32_t lastModification_ = 0;
   std::int32_t size_ = 0;
   std::unique_ptr<OwnedList<File>> files_;

@@ -10,8 +10,22 @@
 FileDescriptor::FileDescriptor(const char *path, int flags)
     : fd_(open(path, flags | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666)) {}
 
+FileDescriptor &FileDescriptor::operator=(FileDescriptor &&other) noexcept {
+  if (this != &other) {
+    close();
+    fd_ = other.release();
+  }
+  return *this;
+}
+
 FileDescriptor::~FileDescriptor() {
   close();
+}
+
+int FileDescriptor::release() {
+  const int fd = fd_;
+  fd_ = -1;
+  return fd;
 }
 
 bool FileDescriptor::write(const std::string &text) const {
@@ -25,6 +39,10 @@ bool FileDescriptor::write(const char *text, std::size_t length) const {
       continue;
     if (written < 0)
       return false;
+    if (written == 0) { // no reason is given, and asking again would go on for ever
+      errno = ENOSPC;
+      return false;
+    }
     text += written;
     length -= static_cast<std::size_t>(written);
   }
@@ -40,7 +58,6 @@ ssize_t FileDescriptor::read(char *buffer, std::size_t size) const {
 }
 
 bool FileDescriptor::close() {
-  const int fd = fd_;
-  fd_ = -1;
+  const int fd = release();
   return fd < 0 || ::close(fd) == 0;
 }

@@ -7,9 +7,12 @@ set(wrapped_calls
   close
   dup2
   execvp
+  fchmod
+  fchown
   fcntl
   fork
   fsync
+  ftruncate
   getcwd
   getpwuid
   getuid
@@ -17,9 +20,11 @@ set(wrapped_calls
   localtime
   localtime_r
   lseek
+  lstat
   malloc
   mkdir
   open
+  openat
   opendir
   pipe
   putenv
@@ -27,6 +32,7 @@ set(wrapped_calls
   readdir
   rmdir
   stat
+  syncfs
   uname
   unlink
   wait

@@ -7,26 +7,16 @@
 #include <algorithm>
 #include <cstdio>
 
-#include <fcntl.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include "failure.h"
-#include "filedescriptor.h"
+#include "newdirectories.h"
+#include "signalguard.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchprocessor"
 
 namespace {
-
-/// Puts what has been extracted on disk before the first old file goes, in one call for all of it: after a
-/// power failure every file is then either the old one or the new one, never an empty one. A system that
-/// cannot do it does not keep the patch from being installed.
-void flushToDisk() {
-  const FileDescriptor directory(".", O_RDONLY | O_DIRECTORY);
-  if (directory.isOpen())
-    static_cast<void>(syncfs(directory.get()));
-}
 
 bool isSameDirectory(const struct stat &a, const struct stat &b) {
   return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
@@ -53,10 +43,11 @@ struct Walk {
   std::string directory;
   std::string home;
   PatchError *err;
+  NewDirectories *made; ///< null where nothing is made
 };
 
-Walk walkFromHere(PatchError *err) {
-  return {Util::getCurrentDirectory(), Util::getQuillHome(), err};
+Walk walkFromHere(PatchError *err, NewDirectories *made = nullptr) {
+  return {Util::getCurrentDirectory(), Util::getQuillHome(), err, made};
 }
 
 /// Visits what a directory holds, sub-directories first, up to the first visit that fails.
@@ -80,24 +71,23 @@ bool moveRegularFile(File &entry, const Walk &walk) {
   return true;
 }
 
-bool makeTargetDirectory(const std::string &path, PatchError *err) {
+bool makeTargetDirectory(const std::string &path, const Walk &walk) {
   File target(path);
   if (target.exists())
     return true;
   LOG_INFO_MESSAGE("PP_MAKE_DIR", path.c_str());
-  if (target.mkdir())
+  if (target.mkdir(*walk.made))
     return true;
-  FAILURE(err, PatchError::CannotMakeDirectory, "ERROR_PP_MAKE_DIR", path.c_str());
+  FAILURE(walk.err, PatchError::CannotMakeDirectory, "ERROR_PP_MAKE_DIR", path.c_str());
   // KEEP(mkdir-null-record): without a record the walk goes on; what cannot be moved then says so itself.
-  return err == nullptr;
+  return walk.err == nullptr;
 }
 
 bool moveEntry(File &entry, const Walk &walk) {
   LOG_TRACE("PatchProcessor::moveFile() %s", "entry");
   bool result = false;
   if (entry.isDirectory())
-    result =
-        makeTargetDirectory(walk.home + entry.getPath(), walk.err) && visitEntries(entry, walk, moveEntry);
+    result = makeTargetDirectory(walk.home + entry.getPath(), walk) && visitEntries(entry, walk, moveEntry);
   else
     result = moveRegularFile(entry, walk);
   LOG_TRACE("PatchProcessor::moveFile() %s", "exit");
@@ -131,7 +121,10 @@ bool PatchProcessor::moveFiles(PatchError *err) {
   if (!Util::setCurrentDirectory(source))
     return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", source.c_str());
   LOG_INFO_MESSAGE("PP_MOVE_FILES", source.c_str(), Util::getQuillHome().c_str());
-  flushToDisk();
+  // Before the first old file goes: after a power failure every file is then either the old one or the new
+  // one, never an empty one.
+  flushToDisk(".");
+  mayHaveMoved_ = true;
   File root(".");
   bool result = moveFile(&root, err);
   if (!Util::setCurrentDirectory(previousDirectory))
@@ -142,7 +135,10 @@ bool PatchProcessor::moveFiles(PatchError *err) {
 }
 
 bool PatchProcessor::moveFile(File *entry, PatchError *err) {
-  return moveEntry(*entry, walkFromHere(err));
+  // An interruption would leave a file without its owner and mode, which no repetition knows.
+  const SignalGuard guard;
+  NewDirectories made;
+  return moveEntry(*entry, walkFromHere(err, &made));
 }
 
 bool PatchProcessor::listFiles(PatchError *err) {

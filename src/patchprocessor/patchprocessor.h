@@ -124,6 +124,7 @@ private:
   std::string home_;
   std::unique_ptr<PatchDescriptor> descriptor_;
   std::map<std::string, Instances> dependents_;
+  bool mayHaveMoved_ = false; ///< files of the product, which must be on disk before the level is
 };
 
 /// Product code of the OS agent, which has its own restart rule.
@@ -134,6 +135,10 @@ ORVComponent::Type targetKind(const std::string &target);
 
 /// The installed component of a product code; null when the product is not installed.
 ORVComponent *getComponent(const std::string &code);
+
+/// Puts on disk, in one call, what the file system of `directory` still has to write. A system that cannot do
+/// it does not keep a patch from being installed.
+void flushToDisk(const std::string &directory);
 
 /// Path of the version file that records the level of the patched component.
 std::string getVerFileName(const PatchDescriptor *descriptor, const std::string &home,

@@ -10,17 +10,30 @@
 
 #include "failure.h"
 #include "filedescriptor.h"
+#include "signalguard.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchprocessor"
 
 namespace {
 
+/// Puts a file on disk. A file system that does not know of it has done what it does.
+bool flush(const FileDescriptor &file) {
+  return fsync(file.get()) == 0 || errno == EINVAL || errno == ENOSYS || errno == EROFS;
+}
+
 /// Writes all of `text` and puts it on disk; 0 or an error number.
-int writeToDisk(FileDescriptor &file, const std::string &text) {
-  if (!file.write(text) || fsync(file.get()) != 0 || !file.close())
-    return errno;
-  return 0;
+int appendToDisk(FileDescriptor &file, const std::string &text) {
+  return file.write(text) && flush(file) && file.close() ? 0 : errno;
+}
+
+/// The same from the beginning of the file, which ends behind it then. What it held is cut only when all of
+/// the text is written: a full disk, or the end of the program in between, leaves a file with a level.
+int replaceOnDisk(FileDescriptor &file, const std::string &text) {
+  return file.write(text) && ftruncate(file.get(), static_cast<off_t>(text.size())) == 0 && flush(file) &&
+                 file.close()
+             ? 0
+             : errno;
 }
 
 std::string paddedTo(std::size_t width, std::string text) {
@@ -71,6 +84,12 @@ const Support *supportOf(ORVComponent::Type kind) {
 
 } // namespace
 
+void flushToDisk(const std::string &directory) {
+  const FileDescriptor opened(directory.c_str(), O_RDONLY | O_DIRECTORY);
+  if (opened.isOpen())
+    static_cast<void>(syncfs(opened.get()));
+}
+
 std::string getVerFileName(const PatchDescriptor *descriptor, const std::string &home,
                            const std::string &patchFilePath) {
   const PatchFileName fileName(File(patchFilePath).getName());
@@ -95,19 +114,23 @@ bool PatchProcessor::updatePatchVerFile(PatchError *err) {
   if (error != 0)
     return FAILURE(err, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(),
                    std::to_string(error).c_str());
-  // The whole text first: nothing can fail between the truncation and the one write.
+  // The whole text first, for one write of it.
   const std::string level = "VRMF = " + descriptor_->getVersion()->getVersionString();
   std::string text;
   for (const std::string &line : lines)
     text += (line.rfind("VRMF", 0) == 0 ? level : line) + "\n";
 
-  FileDescriptor file(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC);
+  // A file system may put the new level on disk before the names of the files that were moved.
+  if (mayHaveMoved_)
+    flushToDisk(home_);
+  const SignalGuard guard;
+  FileDescriptor file(path.c_str(), O_WRONLY | O_CREAT);
   if (!file.isOpen())
     return FAILURE(err, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(),
                    strerror(errno));
   // KEEP(version-write-true): a level that could not be written is logged, but does not fail the patch, whose
   // files are all in place.
-  error = writeToDisk(file, text);
+  error = replaceOnDisk(file, text);
   if (error != 0)
     LOG_ERROR_MESSAGE("ERROR_PP_UPDATE_VRMF", path.c_str(), strerror(error));
   LOG_TRACE("PatchProcessor::updatePatchVerFile() = %d", true);
@@ -122,11 +145,12 @@ void PatchProcessor::updatePatchRegistry(bool passed) {
                              " | " + (passed ? "PASS" : "FAIL") + " | " + paddedTo(15, Util::getUserName()) +
                              " | " + now() + "\n";
   const std::string path = home_ + "patchlogs/patches.hist";
+  const SignalGuard guard;
   FileDescriptor file(path.c_str(), O_WRONLY | O_CREAT | O_APPEND);
   int error = errno;
   if (file.isOpen()) {
     const bool isEmpty = lseek(file.get(), 0, SEEK_END) == 0;
-    error = writeToDisk(file, (isEmpty ? historyHeader() : "") + record);
+    error = appendToDisk(file, (isEmpty ? historyHeader() : "") + record);
   }
   if (error != 0)
     LOG_ERROR_MESSAGE("ERROR_PP_UPDATE_HIST", path.c_str(), strerror(error));

@@ -18,10 +18,11 @@ HEADERS = [path for path in SOURCES if path.suffix == ".h"]
 # Units on one level do not include one another, unless it is said here. The look-ups of home, host and user
 # depend on nothing; the log takes them from utilities.
 LEVELS = [
-    {"nls", "filedescriptor", "ownedlist"},
+    {"nls", "filedescriptor", "ownedlist", "signalguard"},
     {"logger"},
     {"failure"},
-    {"version", "process", "utilities"},
+    {"version", "process", "utilities", "heldfile"},
+    {"newdirectories", "symboliclinks"},
     {"file", "inifile"},
     {"orvcomponent"},
     {"orvcomponentregistry", "patchfilename", "patchdescriptor"},

@@ -122,6 +122,12 @@ int __real_fsync(int descriptor);
 off_t __real_lseek(int descriptor, off_t offset, int whence);
 int __real_access(const char *path, int mode);
 int __real_stat(const char *path, struct stat *status);
+int __real_lstat(const char *path, struct stat *status);
+int __real_openat(int directory, const char *path, int flags, ...);
+int __real_fchown(int descriptor, uid_t owner, gid_t group);
+int __real_fchmod(int descriptor, mode_t mode);
+int __real_ftruncate(int descriptor, off_t length);
+int __real_syncfs(int descriptor);
 int __real_link(const char *source, const char *target);
 int __real_unlink(const char *path);
 int __real_chown(const char *path, uid_t owner, gid_t group);
@@ -187,6 +193,7 @@ ssize_t __wrap_read(int descriptor, void *buffer, size_t size) {
   return count;
 }
 
+// A transfer limit of nothing makes a write answer 0.
 ssize_t __wrap_write(int descriptor, const void *buffer, size_t size) {
   return fails("write") ? -1 : __real_write(descriptor, buffer, std::min(size, state().transferLimit));
 }
@@ -214,6 +221,34 @@ int __wrap_access(const char *path, int mode) {
 
 int __wrap_stat(const char *path, struct stat *status) {
   return fails("stat", path) ? -1 : __real_stat(path, status);
+}
+
+int __wrap_lstat(const char *path, struct stat *status) {
+  return fails("lstat", path) ? -1 : __real_lstat(path, status);
+}
+
+int __wrap_openat(int directory, const char *path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = (flags & O_CREAT) != 0 ? va_arg(arguments, mode_t) : 0;
+  va_end(arguments);
+  return fails("openat", path) ? -1 : __real_openat(directory, path, flags, mode);
+}
+
+int __wrap_fchown(int descriptor, uid_t owner, gid_t group) {
+  return fails("fchown") ? -1 : __real_fchown(descriptor, owner, group);
+}
+
+int __wrap_fchmod(int descriptor, mode_t mode) {
+  return fails("fchmod") ? -1 : __real_fchmod(descriptor, mode);
+}
+
+int __wrap_ftruncate(int descriptor, off_t length) {
+  return fails("ftruncate") ? -1 : __real_ftruncate(descriptor, length);
+}
+
+int __wrap_syncfs(int descriptor) {
+  return fails("syncfs") ? -1 : __real_syncfs(descriptor);
 }
 
 int __wrap_link(const char *source, const char *target) {

@@ -6,6 +6,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "fakehome.h"
 #include "file.h"
 #include "scratch.h"
 
@@ -273,6 +274,42 @@ TEST_F(FileMoveTest, LinkInPlaceOfTheTargetIsReplacedAndItsFileIsLeft) {
   EXPECT_EQ(read(target()), "new");
   EXPECT_EQ(modeOf(target()), 0600U);
   EXPECT_EQ(read(home() + "pointed-to"), "kept");
+}
+
+TEST_F(FileMoveTest, SetIdBitsOfWhatALinkLedToAreNotTakenOver) {
+  File file(writeSource());
+  write("pointed-to", "kept", 07751);
+  fs::create_symlink("pointed-to", target());
+  EXPECT_TRUE(file.moveFile(target(), true));
+  EXPECT_EQ(modeOf(target()), 01751U);
+  EXPECT_EQ(modeOf(home() + "pointed-to"), 07751U);
+}
+
+TEST_F(FileMoveTest, LinkIsMovedAndWhatItLeadsToGetsTheMode) {
+  write("pointed-to", "kept", 0600);
+  fs::create_symlink("pointed-to", source());
+  File link(source());
+  EXPECT_TRUE(link.moveFile(target(), true));
+  EXPECT_TRUE(fs::is_symlink(target()));
+  EXPECT_FALSE(isThere(source()));
+  EXPECT_EQ(modeOf(home() + "pointed-to"), 0755U);
+}
+
+TEST_F(FileMoveTest, PipeIsMovedWithoutAWait) {
+  ASSERT_EQ(mkfifo(source().c_str(), 0600), 0);
+  File pipe(source());
+  EXPECT_TRUE(pipe.moveFile(target(), true));
+  EXPECT_TRUE(fs::is_fifo(target()));
+  EXPECT_EQ(modeOf(target()), 0755U);
+}
+
+TEST_F(FileMoveTest, FileThatItsOwnerMayNotReadIsMovedLikeAnyOther) {
+  File file(writeSource(0));
+  writeTarget(0640);
+  const BoundByPermissions bound(home());
+  EXPECT_TRUE(file.moveFile(target(), true));
+  EXPECT_EQ(modeOf(target()), 0640U);
+  EXPECT_EQ(logLines(), moved({deletingTarget(target())}));
 }
 
 TEST_F(FileMoveTest, DanglingLinkInPlaceOfTheTargetIsNotReplaced) {

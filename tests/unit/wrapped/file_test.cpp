@@ -4,8 +4,11 @@
 #include <cerrno>
 #include <filesystem>
 #include <string>
+#include <utility>
 
 #include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
 
 #include "systemcalls.h"
 
@@ -80,7 +83,7 @@ TEST_F(FileFailureTest, FileThatCannotBeDeletedStaysAndIsSaidToBeGone) {
 TEST_F(FileFailureTest, TargetWhoseModeCannotBeLookedUpIsReplacedWithMode0755) {
   File file(write("source", "new", 0600));
   write("target", "old", 0640);
-  failCall("stat", EIO).on(target()).times(1);
+  failCall("lstat", EIO).on(target()).times(1);
   EXPECT_TRUE(file.moveFile(target(), true));
   EXPECT_EQ(read(target()), "new");
   EXPECT_EQ(modeOf(target()), 0755U);
@@ -110,35 +113,112 @@ TEST_F(FileFailureTest, LinkAcrossFileSystemsIsNeverReplacedByACopy) {
 
 TEST_F(FileFailureTest, SourceThatCannotBeUnlinkedLeavesBothNames) {
   File file(write("source", "new", 0600));
+  restoreSystemCalls();
   failCall("unlink", EACCES).on(source());
   EXPECT_FALSE(file.moveFile(target(), true));
   EXPECT_TRUE(sameFile(source(), target()));
   EXPECT_EQ(modeOf(target()), 0600U);
   EXPECT_EQ(file.getPath(), source());
-  EXPECT_EQ(callsOf("chown", target()) + callsOf("chmod", target()), 0);
+  EXPECT_EQ(callsOf("fchown") + callsOf("fchmod") + callsOf("chown") + callsOf("chmod"), 0);
   EXPECT_EQ(logLines(), moved({fileTrace("unable to unlink: " + source() + ". Permission denied")}));
 }
 
 TEST_F(FileFailureTest, OwnerThatCannotBeSetFailsTheMove) {
   File file(write("source", "new", 0600));
-  failCall("chown", EPERM).on(target());
+  restoreSystemCalls();
+  failCall("fchown", EPERM);
   EXPECT_FALSE(file.moveFile(target(), true));
   EXPECT_FALSE(isThere(source()));
   EXPECT_EQ(read(target()), "new");
   EXPECT_EQ(modeOf(target()), 0600U);
   EXPECT_EQ(file.getPath(), target());
-  EXPECT_EQ(callsOf("chmod", target()), 0);
+  EXPECT_EQ(callsOf("fchmod") + callsOf("chmod"), 0);
   EXPECT_EQ(logLines(), moved({fileTrace("unable to chown for file: " + target())}));
 }
 
 TEST_F(FileFailureTest, ModeThatCannotBeSetLeavesTheMoveASuccess) {
   File file(write("source", "new", 0600));
-  failCall("chmod", EPERM).on(target());
+  failCall("fchmod", EPERM);
   EXPECT_TRUE(file.moveFile(target(), true)); // KEEP(chmod-ignored)
   EXPECT_FALSE(isThere(source()));
   EXPECT_EQ(modeOf(target()), 0600U);
   EXPECT_EQ(file.getPath(), target());
   EXPECT_EQ(logLines(), moved({fileTrace("unable to chmod for file: " + target())}));
+}
+
+/// Why a source cannot be opened for reading, and how often: once, or for good.
+struct OpenFailure {
+  int reason;
+  int times;
+};
+
+class UnopenedSourceTest : public FileFailureTest, public ::testing::WithParamInterface<OpenFailure> {
+protected:
+  void failOpening() const { failCall("openat", GetParam().reason).on(source()).times(GetParam().times); }
+};
+
+TEST_P(UnopenedSourceTest, IsMovedLikeAnyOther) {
+  File file(write("source", "new", 0600));
+  write("target", "old", 0640);
+  if (runsAsRoot()) {
+    ASSERT_EQ(chown(target().c_str(), 1234, 2345), 0);
+  }
+  failOpening();
+  EXPECT_TRUE(file.moveFile(target(), true));
+  EXPECT_EQ(read(target()), "new");
+  EXPECT_FALSE(isThere(source()));
+  EXPECT_EQ(file.getPath(), target());
+  EXPECT_EQ(modeOf(target()), 0640U);
+  struct stat status = {};
+  ASSERT_EQ(stat(target().c_str(), &status), 0);
+  if (runsAsRoot()) {
+    EXPECT_EQ(std::make_pair(status.st_uid, status.st_gid), std::make_pair(uid_t{1234}, gid_t{2345}));
+  }
+  EXPECT_EQ(logLines(), moved({deletingTarget()}));
+}
+
+TEST_P(UnopenedSourceTest, LinkIsStillMovedAsALink) {
+  write("pointed-to", "kept", 0600);
+  fs::create_symlink("pointed-to", source());
+  File link(source());
+  failOpening();
+  EXPECT_TRUE(link.moveFile(target(), true));
+  EXPECT_TRUE(fs::is_symlink(target()));
+  EXPECT_EQ(modeOf(home() + "pointed-to"), 0755U);
+}
+
+INSTANTIATE_TEST_SUITE_P(Reasons, UnopenedSourceTest,
+                         ::testing::Values(OpenFailure{EACCES, 1}, OpenFailure{EMFILE, 1},
+                                           OpenFailure{EMFILE, -1}, OpenFailure{ENFILE, -1},
+                                           OpenFailure{ENOMEM, -1}));
+
+TEST_F(FileFailureTest, SourceThatCannotBeOpenedAndNotLinkedStays) {
+  File file(write("source", "new", 0600));
+  failCall("openat", EMFILE);
+  failCall("link", EMLINK);
+  EXPECT_FALSE(file.moveFile(target(), true));
+  EXPECT_EQ(read(source()), "new");
+  EXPECT_EQ(logLines(), moved({notLinked("Too many links")}));
+}
+
+TEST_F(FileFailureTest, OwnerOfAnUnopenedSourceThatCannotBeSetFailsTheMoveOnceItIsThere) {
+  File file(write("source", "new", 0600));
+  restoreSystemCalls();
+  failCall("openat", EMFILE);
+  failCall("chown", EPERM);
+  EXPECT_FALSE(file.moveFile(target(), true));
+  EXPECT_FALSE(isThere(source()));
+  EXPECT_EQ(read(target()), "new");
+  EXPECT_EQ(callsOf("chmod"), 0);
+  EXPECT_EQ(logLines(), moved({fileTrace("unable to chown for file: " + target())}));
+}
+
+TEST_F(FileFailureTest, AttributesReachTheMovedFileAndNotItsNames) {
+  File file(write("source", "new", 0600));
+  restoreSystemCalls();
+  EXPECT_TRUE(file.moveFile(target(), true));
+  EXPECT_EQ(callsOf("chown") + callsOf("chmod"), 0);
+  EXPECT_EQ(modeOf(target()), 0755U);
 }
 
 TEST_F(FileFailureTest, CopyThatCannotBeLinkedFails) {
@@ -174,23 +254,31 @@ TEST_F(FileFailureTest, DirectoryThatCannotBeMadeEndsTheChain) {
                       fileTrace("creating dir: " + home() + "a/b/"), fileTrace("File::mkdir = 0")}));
 }
 
-TEST_F(FileFailureTest, DirectoryWhoseModeCannotBeSetIsMadeAllTheSame) {
+TEST_F(FileFailureTest, DirectoryWhoseModeCannotBeSetIsMadeAllTheSameAndStaysClosed) {
   const UmaskScope usual(022);
-  failCall("chmod", EPERM);
+  failCall("fchmod", EPERM);
   File directory(home() + "a/b");
   EXPECT_TRUE(directory.mkdir());
   EXPECT_TRUE(directory.isDirectory());
-  EXPECT_EQ(modeOf(home() + "a/b"), 0755U);
+  EXPECT_EQ(modeOf(home() + "a/b"), 0700U);
 }
 
-TEST_F(FileFailureTest, DirectoryWhoseModeCannotBeLookedUpKeepsTheOneItWasMadeWith) {
+TEST_F(FileFailureTest, DirectoryThatCannotBeLookedUpStaysClosed) {
   const UmaskScope usual(022);
-  failCall("stat", EIO).on(home() + "a/b/");
+  failCall("lstat", EIO).on(home() + "a/b");
   File directory(home() + "a/b");
   EXPECT_TRUE(directory.mkdir());
-  EXPECT_EQ(callsOf("chmod", home() + "a/b/"), 0);
+  EXPECT_EQ(callsOf("fchmod"), 1);
   EXPECT_EQ(modeOf(home() + "a"), 0777U);
-  EXPECT_EQ(modeOf(home() + "a/b"), 0755U);
+  EXPECT_EQ(modeOf(home() + "a/b"), 0700U);
+}
+
+TEST_F(FileFailureTest, EachDirectoryIsLookedForOnceUnlessDotsStandInTheWay) {
+  EXPECT_TRUE(File(home() + "a/b").mkdir());
+  EXPECT_EQ(callsOf("access"), 3) << "a/b, a and the home";
+  restoreSystemCalls();
+  EXPECT_TRUE(File(home() + "c/./d").mkdir());
+  EXPECT_EQ(callsOf("access"), 6) << "behind the dot once more";
 }
 
 TEST_F(FileFailureTest, DirectoryThatCannotBeOpenedHasEmptyLists) {

@@ -157,9 +157,79 @@ TEST_P(VersionOnDiskTest, FailureIsLoggedAndThePatchGoesOn) {
   EXPECT_NE(read(path).find("VRMF = 06200001\n"), std::string::npos);
 }
 
+/// A file system that does not know of flushing.
+class NoFlushTest : public RefusedTest, public ::testing::WithParamInterface<int> {};
+
+TEST_P(NoFlushTest, IsNoFailure) {
+  const std::string path = install("xelpp266.ver", "06200000");
+  const Processor kxe = processor();
+  failCall("fsync", GetParam());
+  EXPECT_TRUE(kxe->updatePatchVerFile(nullptr));
+  EXPECT_EQ(read(path), "desc = \nVRMF = 06200001\n\n");
+  kxe->updatePatchRegistry(true);
+  EXPECT_EQ(callsOf("fsync"), 2);
+  for (const LogLine &line : ownLines())
+    EXPECT_NE(line.level, "ERROR") << line;
+}
+
+INSTANTIATE_TEST_SUITE_P(Reasons, NoFlushTest, ::testing::Values(EINVAL, ENOSYS, EROFS));
+
+TEST_F(RefusedTest, EndBetweenWritingAndCuttingTheVersionFileLeavesALevel) {
+  const std::string path = write("registry/xelpp266.ver", "a\r\n\r\nVRMF = 06200000\r\nb\r\n");
+  const Processor kxe = processor();
+  failCall("ftruncate", EIO).times(1);
+  EXPECT_TRUE(kxe->updatePatchVerFile(nullptr)); // KEEP(version-write-true)
+  EXPECT_EQ(read(path), "a\nVRMF = 06200001\nb\n\n\nb\r\n") << "behind the new text the end of the old one";
+  EXPECT_TRUE(kxe->updatePatchVerFile(nullptr));
+  EXPECT_EQ(read(path), "a\nVRMF = 06200001\nb\nb\n\n");
+}
+
+TEST_F(RefusedTest, VersionFileIsNotCutBeforeAllOfItIsWritten) {
+  const std::string before = "desc = a long name\nVRMF = 06200000\n";
+  const std::string path = write("registry/xelpp266.ver", before);
+  const Processor kxe = processor();
+  constexpr int LinesOfTheLogBefore = 5; // entry, and the four of the reader; each is one write
+  failCall("write", ENOSPC).after(LinesOfTheLogBefore).times(1);
+  EXPECT_TRUE(kxe->updatePatchVerFile(nullptr));
+  EXPECT_EQ(read(path), before);
+}
+
+TEST_F(RefusedTest, MovedFilesAreOnDiskBeforeTheLevelIs) {
+  write("tmp/kxe/updated_files/bin/agent", "new");
+  install("xelpp266.ver", "06200000");
+  const Processor kxe = processor();
+  EXPECT_TRUE(kxe->moveFiles(nullptr));
+  restoreSystemCalls();
+  EXPECT_TRUE(kxe->updatePatchVerFile(nullptr));
+  EXPECT_EQ(callsAmong({"syncfs", "ftruncate", "fsync"}), (Names{"syncfs", "ftruncate", "fsync"}));
+  EXPECT_EQ(callsOf("open", home()), 1);
+}
+
+TEST_F(RefusedTest, LevelIsWrittenWhenTheMovedFilesCannotBeFlushed) {
+  write("tmp/kxe/updated_files/bin/agent", "new");
+  const std::string path = install("xelpp266.ver", "06200000");
+  const Processor kxe = processor();
+  failCall("syncfs", EIO);
+  EXPECT_TRUE(kxe->moveFiles(nullptr));
+  failCall("open", EMFILE).on(home());
+  PatchError err;
+  EXPECT_TRUE(kxe->updatePatchVerFile(&err));
+  EXPECT_EQ(recordOf(err), NoError);
+  EXPECT_EQ(read(path), "desc = \nVRMF = 06200001\n\n");
+}
+
+TEST_F(RefusedTest, PatchWithoutFilesFlushesNoFileSystem) {
+  install("xelpp266.ver", "06200000");
+  const Processor kxe = processor();
+  EXPECT_TRUE(kxe->moveFiles(nullptr));
+  EXPECT_TRUE(kxe->updatePatchVerFile(nullptr));
+  EXPECT_EQ(callsOf("syncfs"), 0);
+}
+
 // Before the close of the version file come those of five lines of the log and that of the reader.
 INSTANTIATE_TEST_SUITE_P(Calls, VersionOnDiskTest,
-                         ::testing::Values(LateFailure{"fsync", 0}, LateFailure{"close", 6}),
+                         ::testing::Values(LateFailure{"ftruncate", 0}, LateFailure{"fsync", 0},
+                                           LateFailure{"close", 6}),
                          [](const auto &test) { return test.param.call; });
 
 TEST_F(RefusedTest, FilesMoveWhenTheDiskCannotBeToldToWriteFirst) {

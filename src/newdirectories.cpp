@@ -1,0 +1,47 @@
+#include "newdirectories.h"
+
+#include <algorithm>
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "heldfile.h"
+
+namespace {
+
+/// What mkdir has made belongs to the effective user and is closed to all others.
+bool isOwn(const struct stat &status) {
+  return S_ISDIR(status.st_mode) && status.st_uid == geteuid() && (status.st_mode & 077) == 0;
+}
+
+} // namespace
+
+bool NewDirectories::make(const std::string &path) {
+  if (mkdir(path.c_str(), 0700) != 0)
+    return false;
+  const std::string name = path.substr(0, path.find_last_not_of('/') + 1);
+  struct stat status = {};
+  if (lstat(name.c_str(), &status) != 0 || !isOwn(status))
+    return true; // it is there, but nothing that could be opened safely
+  made_.push_back({name, status.st_dev, status.st_ino});
+  // A umask may have taken from the owner what the work in it needs.
+  if ((status.st_mode & 0700) != 0700) {
+    const HeldFile directory(name, HeldFile::Kind::Directory);
+    struct stat held = {};
+    if (directory.look(held) && held.st_dev == status.st_dev && held.st_ino == status.st_ino)
+      static_cast<void>(directory.setMode((held.st_mode & 07777) | 0700));
+  }
+  return true;
+}
+
+void NewDirectories::openToAll(const Directory &directory) {
+  const HeldFile held(directory.path, HeldFile::Kind::Directory);
+  struct stat status = {};
+  if (held.look(status) && isOwn(status) && status.st_dev == directory.device &&
+      status.st_ino == directory.inode)
+    static_cast<void>(held.setMode((status.st_mode & 07777) | 0777));
+}
+
+NewDirectories::~NewDirectories() {
+  std::for_each(made_.rbegin(), made_.rend(), openToAll);
+}
