@@ -35,15 +35,15 @@ std::size_t slashBeforeEnd(const std::string &path) {
   return path.size() < 2 ? std::string::npos : path.rfind('/', path.size() - 2);
 }
 
-/// What a file at its new place is to look like.
+/// Owner, group and mode of a file at its new place.
 struct Attributes {
   mode_t mode = 0755;
   uid_t owner = static_cast<uid_t>(-1);
   gid_t group = static_cast<gid_t>(-1);
 };
 
-/// The attributes of what stands at the target, in one call for each file of a patch. A link is followed, but
-/// the set-id bits of what it leads to are not for the new file: whoever made the link chose them.
+/// The attributes of the target, in one call for each file of a patch. A link is followed, but the set-id
+/// bits of its destination are not taken over: the maker of the link chose them.
 bool lookUp(const std::string &target, Attributes &attributes) {
   struct stat status = {};
   if (lstat(target.c_str(), &status) != 0)
@@ -58,8 +58,8 @@ bool lookUp(const std::string &target, Attributes &attributes) {
   return true;
 }
 
-/// Removes what stands at the target and returns the attributes that the new file inherits from it. Only when
-/// they cannot be looked up for another reason than its absence is the existence asked for.
+/// Removes the target and returns the attributes that the new file inherits from it. Its existence is checked
+/// only when they cannot be looked up for another reason than its absence.
 Attributes clearTarget(const std::string &target) {
   Attributes attributes;
   if (!lookUp(target, attributes)) {
@@ -69,13 +69,13 @@ Attributes clearTarget(const std::string &target) {
     LOG_TRACE("Unable to lookup file permissions: %s", strerror(error));
   }
   LOG_TRACE("deleting existing target: %s", target.c_str());
-  // When the old file stays, the link finds the name taken and says so.
+  // When the old file stays, the link fails and reports that the name is taken.
   static_cast<void>(unlink(target.c_str()));
   return attributes;
 }
 
-/// What became of owner and mode: an error number, or 0. The mode follows the owner, and only when that could
-/// be set: a change of owner takes set-id bits away.
+/// Sets owner and mode; an error number, or 0. The mode is set after the owner, since a change of owner
+/// removes set-id bits, and only if the owner could be set.
 struct Outcome {
   int owner = 0;
   int mode = 0;
@@ -159,7 +159,7 @@ void File::initialize() {
   // then empty, does not exist for this class.
   const bool slash = endsInSlash(path_);
   struct stat status = {};
-  // Two pointers: of two strings the conditional would make a copy, for every file.
+  // Two pointers: with two strings the conditional would make a copy for every file.
   if (stat(slash ? path_.substr(0, path_.size() - 1).c_str() : path_.c_str(), &status) != 0) {
     const int error = errno;
     if (error != ENOENT && error != ENOTDIR)
@@ -170,8 +170,8 @@ void File::initialize() {
   isDirectory_ = S_ISDIR(status.st_mode);
   isFile_ = !isDirectory_;
   isRegular_ = S_ISREG(status.st_mode);
-  // What can be looked at is accessible too, unless the "/" that was left out asks for a directory. A call of
-  // access for each snapshot would only repeat that, at a twentieth of a large installation's time.
+  // A path with a status is accessible too, unless the "/" that was left out requires a directory. A call of
+  // access for each snapshot would take a twentieth of a large installation's time.
   exists_ = isDirectory_ || !slash;
   lastModification_ = static_cast<std::int32_t>(status.st_mtime);
   size_ = static_cast<std::int32_t>(status.st_size);
@@ -216,7 +216,7 @@ bool File::deleteFile() {
     // KEEP(delete-error-text): the text is that of unlink's result, not of the error number.
     LOG_TRACE("Unable to delete file [%s]: %s", path_.c_str(), strerror(result));
   }
-  // KEEP(delete-inverted-exists): the flag says the opposite of what is left on disk; nobody asks it after a
+  // KEEP(delete-inverted-exists): the flag is the opposite of the state on disk; no caller uses it after a
   // deletion.
   exists_ = result == 0;
   return result == 0;
@@ -237,12 +237,11 @@ int File::moveTo(const std::string &target, bool overwrite) {
     LOG_TRACE("%s does not exist or is not a file", path_.c_str());
     return 0;
   }
-  // Opened before anything changes: owner and mode reach this file, whatever another user puts in the place
-  // of its name meanwhile.
+  // Opened before anything changes: owner and mode reach this file, even if another user exchanges its name.
   const HeldFile source(path_, isRegular_ ? HeldFile::Kind::Regular : HeldFile::Kind::Other);
   const Attributes attributes = overwrite ? clearTarget(target) : Attributes();
   Outcome outcome;
-  // Without a descriptor to be had the name in the temporary directory is the safest one.
+  // Without a descriptor the name in the temporary directory is the safest way.
   if (!source.isHeld() && !source.isLink())
     outcome = setAttributes(path_, attributes);
   const int error = linkAndUnlink(target);
@@ -251,7 +250,7 @@ int File::moveTo(const std::string &target, bool overwrite) {
   path_ = target;
   if (source.isHeld())
     outcome = setAttributes(source, attributes);
-  else if (source.isLink()) // a link is moved itself, and leads on from its new place
+  else if (source.isLink()) // the link itself is moved, and followed from its new place
     outcome = setAttributes(target, attributes);
   // KEEP(chmod-ignored): a wrong mode, unlike a wrong owner, leaves the move a success.
   if (outcome.owner != 0)
@@ -261,7 +260,7 @@ int File::moveTo(const std::string &target, bool overwrite) {
   return outcome.owner;
 }
 
-/// Gives the file its second name and takes the first one away; 0 or an error number.
+/// Gives the file its new name and removes the old one; 0 or an error number.
 int File::linkAndUnlink(const std::string &target) const {
   int error = 0;
   if (link(path_.c_str(), target.c_str()) != 0) {
@@ -316,8 +315,8 @@ bool File::mkdir(NewDirectories &made) {
     isDirectory_ = true;
     exists_ = true;
   }
-  // KEEP(mkdir-known-existence): the result is what the object knows: one that existed before stays true even
-  // when nothing could be made.
+  // KEEP(mkdir-known-existence): the result is the object's flag: it stays true for a path that existed
+  // before, even when nothing could be made.
   LOG_TRACE("File::mkdir = %d", exists_);
   return exists_;
 }
@@ -330,10 +329,10 @@ bool File::makeMissingDirectories(NewDirectories &made) const {
     prefix += component + "/";
     prefixes.push_back(prefix);
   }
-  // What is accessible has accessible ancestors: looking from the end asks once for most directories, where
-  // looking from the start would ask for every ancestor of each directory of a deep tree again.
+  // An accessible path has accessible ancestors: a look from the end takes one call for most directories,
+  // where a look from the start would take one for every ancestor.
   const auto missing = std::find_if(prefixes.rbegin(), prefixes.rend(), isAccessible).base();
-  // What was missing may be there once the directories before it are made, behind "." and ".." alone.
+  // After "." and ".." only, a missing prefix may exist once the ones before it are made.
   bool isNew = true;
   return std::all_of(missing, prefixes.end(), [&](const std::string &path) {
     const std::string &component = components[static_cast<std::size_t>(&path - prefixes.data())];
@@ -378,7 +377,7 @@ void File::loadDir() {
   const std::unique_ptr<DIR, CloseDirectory> stream(opendir(path_.c_str()));
   if (stream == nullptr)
     return;
-  errno = 0; // readdir tells its end from a failure by this alone
+  errno = 0; // only this distinguishes the end from a failure of readdir
   while (const dirent *const entry = readdir(stream.get())) {
     appendEntry(entry->d_name);
     errno = 0;
@@ -397,8 +396,8 @@ void File::appendEntry(const std::string &name) {
 }
 
 bool recursiveDelete(File *directory) {
-  // A link that somebody planted in the tree must not empty a foreign directory: it goes straight to rmdir,
-  // which refuses it.
+  // A link that was planted in the tree must not empty a foreign directory: it goes straight to rmdir, which
+  // refuses it.
   if (!isLink(*directory) && !(deleteFiles(*directory) && deleteSubDirectories(*directory)))
     return false;
   const std::string path = directory->getAbsolutePath();

@@ -1,10 +1,9 @@
-// One path on disk: a snapshot of what it is, its entries when it is a directory, and the few operations that
-// an installation needs.
+// One path on disk: a snapshot of its type, size and time, its entries when it is a directory, and the few
+// operations that an installation needs.
 //
-// A snapshot is taken by the constructors and refreshed only where an operation says so. Nothing here fills
-// an error record: an operation answers false, its reason stands in the log, and the caller words the
-// message. "Moving" and "copying" are hard links: no data is ever copied, and no file reaches another file
-// system.
+// The constructors take the snapshot; it is refreshed only where an operation says so. Nothing here fills an
+// error record: an operation returns false, the log has the reason, and the caller formats the message.
+// "Moving" and "copying" are hard links: no data is ever copied, and no file reaches another file system.
 #pragma once
 
 #include <cstdint>
@@ -42,7 +41,7 @@ public:
   bool isAbsolute() const;
   /// The path itself, or the working directory before it; nothing is normalised.
   std::string getAbsolutePath() const;
-  /// The same for a caller that knows the working directory.
+  /// The same for a given working directory.
   std::string getAbsolutePath(const std::string &workingDirectory) const;
   /// Up to and including the "/" before the last component; see the source for paths without one.
   std::string getParentPath() const;
@@ -52,26 +51,26 @@ public:
   /// Unlinks an existing file; true exactly when that succeeded. Afterwards exists() is inverted.
   bool deleteFile();
   /// Links the file to `target` and unlinks the source. A target that exists is replaced when `overwrite` is
-  /// true, and its owner, group and permission mode are kept (of what a link leads to, not the set-id bits);
-  /// any other new file gets mode 0755. A source that is not there counts as moved. Afterwards the path is
-  /// the target's and the flags are those of before.
+  /// true, and its owner, group and permission mode are kept (those of a link's destination, less its set-id
+  /// bits); any other new file gets mode 0755. A missing source counts as moved. Afterwards the path is the
+  /// target's, and the flags are unchanged.
   bool moveFile(const std::string &target, bool overwrite);
   /// Links the file to `target` too. With `keepExisting` an existing target makes it fail.
   bool copyFile(const std::string &target, bool keepExisting);
   /// Makes the directory and its missing parents, each with mode 0777 whatever the umask. True when the
   /// object exists in the end, as far as it knows.
   bool mkdir();
-  /// The same, but what is made stays closed to other users until `made` goes.
+  /// The same, but new directories stay closed to other users until `made` is destroyed.
   bool mkdir(NewDirectories &made);
-  /// Removes the directory and everything below it. Never follows a symbolic link; where anything stays, all
-  /// links of the tree go even so.
+  /// Removes the directory and everything below it. Never follows a symbolic link; if anything stays, all
+  /// links of the tree are still removed.
   bool rmdir();
 
   /// Entries that are not directories, in the order of the system; loaded once, owned by this object.
   std::vector<File *> *listFiles();
   /// Entries that are directories, likewise.
   std::vector<File *> *listSubDirectories();
-  /// Builds both lists; empty for what cannot be opened as a directory.
+  /// Builds both lists; they are empty if the path cannot be opened as a directory.
   void loadDir();
 
 private:
@@ -93,5 +92,5 @@ private:
 };
 
 /// Deletes the files of a directory, then its sub-directories, then the directory, going on after a failure
-/// as far as the tree allows. True only when everything went.
+/// as far as possible. True only when everything was deleted.
 bool recursiveDelete(File *directory);

@@ -5,8 +5,8 @@
 #include <fcntl.h>
 #include <unistd.h>
 
-// O_NONBLOCK: a pipe that stands in a file's place fails to open, where it would be waited on for ever. Files
-// and directories do not know the flag.
+// O_NONBLOCK: opening a pipe in place of a file fails instead of waiting for ever. For files and directories
+// the flag has no effect.
 FileDescriptor::FileDescriptor(const char *path, int flags)
     : fd_(open(path, flags | O_CLOEXEC | O_NONBLOCK | O_NOCTTY, 0666)) {}
 
@@ -39,7 +39,7 @@ bool FileDescriptor::write(const char *text, std::size_t length) const {
       continue;
     if (written < 0)
       return false;
-    if (written == 0) { // no reason is given, and asking again would go on for ever
+    if (written == 0) { // no reason is given, and a repetition would never end
       errno = ENOSPC;
       return false;
     }

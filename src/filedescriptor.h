@@ -7,10 +7,9 @@
 
 class FileDescriptor {
 public:
-  /// Opens `path` with `flags`, never waiting, not passed on to children, and, for a new file, mode 0666 less
-  /// the umask.
+  /// Opens `path` with `flags`, without waiting and close-on-exec; a new file gets mode 0666 less the umask.
   FileDescriptor(const char *path, int flags);
-  /// Takes over an open descriptor, or none (-1).
+  /// Takes ownership of an open descriptor, or of none (-1).
   explicit FileDescriptor(int fd) : fd_(fd) {}
   FileDescriptor(FileDescriptor &&other) noexcept : fd_(other.release()) {}
   FileDescriptor &operator=(FileDescriptor &&other) noexcept;
@@ -29,7 +28,7 @@ public:
   /// Reads at most `size` bytes, again after a signal; -1, with the reason in errno, on failure.
   ssize_t read(char *buffer, std::size_t size) const;
 
-  /// Gives the open descriptor away; -1 when there is none.
+  /// Releases ownership of the descriptor; -1 when there is none.
   int release();
 
   /// Closes now, to learn whether that succeeds; false with the reason in errno.

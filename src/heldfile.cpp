@@ -12,8 +12,8 @@ bool isLinkAt(int directory, const std::string &name) {
   return fstatat(directory, name.c_str(), &status, AT_SYMLINK_NOFOLLOW) == 0 && S_ISLNK(status.st_mode);
 }
 
-/// A descriptor of the thing itself; -1 when it is a symbolic link or there is no descriptor to be had. One
-/// that only names its place (O_PATH) serves where a user may not read what is his own.
+/// A descriptor of the file or directory; -1 when it is a symbolic link or no descriptor can be had. O_PATH
+/// serves for files that their owner may not read.
 int open(int directory, const std::string &name, HeldFile::Kind kind, bool &isLink) {
   const int flags = O_NOFOLLOW | O_CLOEXEC | (kind == HeldFile::Kind::Directory ? O_DIRECTORY : 0);
   int fd = -1;
@@ -33,7 +33,7 @@ HeldFile::HeldFile(int directory, const std::string &name, Kind kind)
 bool HeldFile::setOwner(uid_t owner, gid_t group) const {
   if (fchown(file_.get(), owner, group) == 0)
     return true;
-  // A descriptor of a place alone is a bad one to the usual calls.
+  // The usual calls refuse a descriptor of O_PATH.
   return errno == EBADF && fchownat(file_.get(), "", owner, group, AT_EMPTY_PATH) == 0;
 }
 

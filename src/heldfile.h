@@ -1,8 +1,8 @@
 // A file or directory held by a descriptor while its owner and mode are set.
 //
-// Between two calls another user may put something else in the place of a name; what a descriptor was opened
-// on stays what it is. Symbolic links are never followed, nothing is waited for, and what is neither a
-// regular file nor a directory is not opened for reading, which can have effects on a device.
+// Between two calls another user may exchange a name, but not the file behind a descriptor. Symbolic links
+// are never followed, no open waits, and only regular files and directories are opened for reading, since
+// that can have effects on a device.
 #pragma once
 
 #include <string>
@@ -16,7 +16,7 @@ class HeldFile {
 public:
   enum class Kind { Regular, Directory, Other };
 
-  /// `path` must not end in "/", which would ask for what a link leads to.
+  /// `path` must not end in "/", which would follow a link.
   HeldFile(const std::string &path, Kind kind) : HeldFile(AT_FDCWD, path, kind) {}
   /// The entry `name` of an open directory.
   HeldFile(int directory, const std::string &name, Kind kind);

@@ -9,7 +9,7 @@
 
 namespace {
 
-/// What mkdir has made belongs to the effective user and is closed to all others.
+/// A directory that mkdir has just made belongs to the effective user and is closed to all others.
 bool isOwn(const struct stat &status) {
   return S_ISDIR(status.st_mode) && status.st_uid == geteuid() && (status.st_mode & 077) == 0;
 }
@@ -22,9 +22,9 @@ bool NewDirectories::make(const std::string &path) {
   const std::string name = path.substr(0, path.find_last_not_of('/') + 1);
   struct stat status = {};
   if (lstat(name.c_str(), &status) != 0 || !isOwn(status))
-    return true; // it is there, but nothing that could be opened safely
+    return true; // it exists, but cannot be opened safely
   made_.push_back({name, status.st_dev, status.st_ino});
-  // A umask may have taken from the owner what the work in it needs.
+  // The umask may have removed permissions of the owner.
   if ((status.st_mode & 0700) != 0700) {
     const HeldFile directory(name, HeldFile::Kind::Directory);
     struct stat held = {};

@@ -1,7 +1,7 @@
-// Directories that are closed to other users as long as the work in them goes on.
+// Directories that are closed to other users until the work in them is done.
 //
-// A user who may write into a directory can exchange what is made or moved there. Each directory is therefore
-// made with mode 0700 and opened when the object goes, whatever became of the work.
+// A user who may write to a directory can exchange new files in it. Each directory is therefore made with
+// mode 0700 and opened by the destructor, whether the work succeeded or not.
 #pragma once
 
 #include <string>
@@ -14,16 +14,16 @@ public:
   NewDirectories() = default;
   NewDirectories(const NewDirectories &) = delete;
   NewDirectories &operator=(const NewDirectories &) = delete;
-  /// Gives each directory the mode that the system gave it with all permissions added, the last one first, so
-  /// that nothing below a directory is left to be done when others may enter it. What stands in the place of
-  /// one that was made, or cannot be opened, is left alone.
+  /// Gives each directory the mode of its making with all permissions added, the last one first, so that all
+  /// work below a directory is done when other users may enter it. A directory that has been exchanged, or
+  /// cannot be opened, is not changed.
   ~NewDirectories();
 
   /// Makes one directory, whatever the umask; false with the reason in errno.
   bool make(const std::string &path);
 
 private:
-  /// Not a descriptor for each: there may be more directories than descriptors.
+  /// No descriptors: there may be more directories than those.
   struct Directory {
     std::string path;
     dev_t device;

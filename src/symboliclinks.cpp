@@ -40,8 +40,8 @@ void list(int directory, Names &links, Names &subDirectories) {
   }
 }
 
-/// One walk through a tree by way of the directories themselves. It has a single directory open: a tree may
-/// be deeper than there are descriptors or than a path may be long.
+/// One walk through a tree by its open directories. Only one is open at a time: a tree may be deeper than the
+/// limits of descriptors and of paths.
 class Sweep {
 public:
   void run(const std::string &root);
@@ -51,8 +51,8 @@ private:
   struct Level {
     dev_t device;
     ino_t inode;
-    mode_t mode;   ///< as it was met
-    bool isOpened; ///< its owner had not every permission until now
+    mode_t mode;   ///< as it was found
+    bool isOpened; ///< its owner lacked a permission
     Names subDirectories;
   };
 
@@ -77,8 +77,8 @@ void Sweep::run(const std::string &root) {
   }
 }
 
-/// Enters a directory and removes its links. Links in a directory that is closed to its owner would lead the
-/// next archive all the same, so it is opened for as long as that takes.
+/// Enters a directory and removes its links. A directory that is closed to its owner is opened for that,
+/// since the next archive would follow its links all the same.
 void Sweep::enter(int directory, const std::string &name) {
   const HeldFile held(directory, name, HeldFile::Kind::Directory);
   struct stat status = {};

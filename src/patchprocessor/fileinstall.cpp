@@ -22,8 +22,8 @@ bool isSameDirectory(const struct stat &a, const struct stat &b) {
   return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
 }
 
-/// Whether the directory is a link to one of those on the way down to it. To enter it would begin the walk
-/// anew, and two such links would double it at each of the 40 levels that the system follows.
+/// Whether the directory is a link to one above it. Entering it would repeat the walk, and two such links
+/// would double it at each of the 40 levels that the system follows.
 bool leadsBack(const std::string &path) {
   struct stat directory = {};
   const std::string name = path.substr(0, path.size() - 1);
@@ -38,7 +38,7 @@ bool leadsBack(const std::string &path) {
   return false;
 }
 
-/// One walk through updated_files. Working directory and home are asked for once, not for each file.
+/// One walk through updated_files. Working directory and home are read once, not for each file.
 struct Walk {
   std::string directory;
   std::string home;
@@ -50,7 +50,7 @@ Walk walkFromHere(PatchError *err, NewDirectories *made = nullptr) {
   return {Util::getCurrentDirectory(), Util::getQuillHome(), err, made};
 }
 
-/// Visits what a directory holds, sub-directories first, up to the first visit that fails.
+/// Visits the entries of a directory, sub-directories first, up to the first visit that fails.
 bool visitEntries(File &directory, const Walk &walk, bool (*visit)(File &entry, const Walk &walk)) {
   if (leadsBack(directory.getPath()))
     return true;
@@ -79,7 +79,7 @@ bool makeTargetDirectory(const std::string &path, const Walk &walk) {
   if (target.mkdir(*walk.made))
     return true;
   FAILURE(walk.err, PatchError::CannotMakeDirectory, "ERROR_PP_MAKE_DIR", path.c_str());
-  // KEEP(mkdir-null-record): without a record the walk goes on; what cannot be moved then says so itself.
+  // KEEP(mkdir-null-record): without a record the walk goes on; each file that cannot be moved is reported.
   return walk.err == nullptr;
 }
 
@@ -121,8 +121,8 @@ bool PatchProcessor::moveFiles(PatchError *err) {
   if (!Util::setCurrentDirectory(source))
     return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", source.c_str());
   LOG_INFO_MESSAGE("PP_MOVE_FILES", source.c_str(), Util::getQuillHome().c_str());
-  // Before the first old file goes: after a power failure every file is then either the old one or the new
-  // one, never an empty one.
+  // Before the first old file is removed: after a power failure every file is then either the old one or the
+  // new one, never an empty one.
   flushToDisk(".");
   mayHaveMoved_ = true;
   File root(".");
@@ -135,7 +135,7 @@ bool PatchProcessor::moveFiles(PatchError *err) {
 }
 
 bool PatchProcessor::moveFile(File *entry, PatchError *err) {
-  // An interruption would leave a file without its owner and mode, which no repetition knows.
+  // An interruption would leave a file without its owner and mode, which no repetition could restore.
   const SignalGuard guard;
   NewDirectories made;
   return moveEntry(*entry, walkFromHere(err, &made));

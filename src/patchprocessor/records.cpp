@@ -1,4 +1,4 @@
-// What remains of a patch: the level in the product's version file, and a line in the patch history.
+// The records of a patch: the level in the product's version file, and a line in the patch history.
 #include "patchprocessor/patchprocessor.h"
 
 #include <cerrno>
@@ -17,7 +17,7 @@
 
 namespace {
 
-/// Puts a file on disk. A file system that does not know of it has done what it does.
+/// Puts a file on disk. That a file system does not offer it is no failure.
 bool flush(const FileDescriptor &file) {
   return fsync(file.get()) == 0 || errno == EINVAL || errno == ENOSYS || errno == EROFS;
 }
@@ -27,7 +27,7 @@ int appendToDisk(FileDescriptor &file, const std::string &text) {
   return file.write(text) && flush(file) && file.close() ? 0 : errno;
 }
 
-/// The same from the beginning of the file, which ends behind it then. What it held is cut only when all of
+/// The same from the beginning of the file, which is then cut to the new length. It is cut only after all of
 /// the text is written: a full disk, or the end of the program in between, leaves a file with a level.
 int replaceOnDisk(FileDescriptor &file, const std::string &text) {
   return file.write(text) && ftruncate(file.get(), static_cast<off_t>(text.size())) == 0 && flush(file) &&
@@ -50,7 +50,7 @@ std::string historyHeader() {
          rule + "\n";
 }
 
-/// Date and time of now in local time; empty when the system cannot tell it.
+/// Current date and time in local time; empty when they cannot be determined.
 std::string now() {
   const time_t seconds = time(nullptr);
   tm local = {};
@@ -62,7 +62,7 @@ std::string now() {
 
 /// Suffix of the version file of a server's support for another product; null for kinds that have none.
 struct Support {
-  const char *serverCode; ///< the server itself has a version file of its own platform
+  const char *serverCode; ///< the server itself has a version file for its platform
   const char *suffix;
 };
 
@@ -114,13 +114,13 @@ bool PatchProcessor::updatePatchVerFile(PatchError *err) {
   if (error != 0)
     return FAILURE(err, PatchError::CannotUpdateVersion, "ERROR_PP_UPDATE_VRMF", path.c_str(),
                    std::to_string(error).c_str());
-  // The whole text first, for one write of it.
+  // The whole text first, for a single write.
   const std::string level = "VRMF = " + descriptor_->getVersion()->getVersionString();
   std::string text;
   for (const std::string &line : lines)
     text += (line.rfind("VRMF", 0) == 0 ? level : line) + "\n";
 
-  // A file system may put the new level on disk before the names of the files that were moved.
+  // A file system may put the new level on disk before the names of the moved files.
   if (mayHaveMoved_)
     flushToDisk(home_);
   const SignalGuard guard;
