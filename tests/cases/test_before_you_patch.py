@@ -5,7 +5,7 @@ import signal
 
 import pytest
 
-from support import Patch, ProductHome, stubs
+from support import Patch, ProductHome, remove_tree, stubs
 
 from catalogue import text
 from productsite import Running, Site
@@ -30,14 +30,24 @@ def site_at(program, patch_dir, scratch):
         home.close()
 
 
-def test_a_relative_home_leaves_the_agents_stopped_and_the_files_lost(site_at):
+def test_a_relative_home_leaves_a_tree_that_fails_the_next_runs(site_at):
     site = site_at("home")
     site.home.start("yn")
     path = site.target(Patch("yn").file("bin/tool"))
-    result = site.run("-h", "home", "-i", path, cwd=site.home.path.parent)
+    result = site.program.run("-h", "home", "-i", path, cwd=site.home.path.parent)
     assert result.status in (25, 26)  # by the order of the listing
     assert site.home.calls() == ["QuillAgent stop yn"]
     assert not site.home.exists("bin/tool") and site.home.level("yn") == "06100000"
+    assert site.program.install(site.home, path).status == 26
+    remove_tree(site.home.path / "tmp/kyn")
+    assert site.program.install(site.home, path).status == 0
+
+
+def test_a_point_as_home_loses_the_new_files(site_at):
+    site = site_at("home")
+    path = site.target(Patch("yn").file("bin/tool"))
+    assert site.run("-h", ".", "-i", path, cwd=site.home.path).status == 25
+    assert [path for path in site.home.tree() if path.endswith("tool")] == []
 
 
 def test_a_relative_home_ends_at_the_first_command(site_at):
