@@ -89,3 +89,18 @@ def test_files_that_were_not_moved_are_found_in_the_log(site):
     assert site.install(patch) == site.done()
     found = printed(site, "sed")
     assert len(found) == 1 and found[0].endswith(" to ./bin/gone")
+
+
+def test_an_empty_version_file_is_put_back_from_the_log(site):
+    site.home.component("yn", "06100000", prereqs=["oxlpp266", "ullpp266"])
+    site.report(Patch("yn").directory())
+    site.home.write("registry/ynlpp266.ver")
+    assert site.install(Patch("yn").file("bin/tool")).status == 9
+    messages = [line.message for line in site.home.log().runs[0].lines]
+    start = messages.index(f"ORVComponentRegistry::buildComponent({site.home.path}/registry/ynlpp266.ver) entry")
+    text = "\n".join(messages[start:messages.index("ORVComponentRegistry::buildComponent exit", start)])
+    level = re.search(r"^Version string provided: (\w+)", text, re.M)[1]
+    prereqs = re.findall(r"^Added preReqALL value = (\w+)", text, re.M)
+    assert (level, prereqs) == ("06100000", ["oxlpp266", "ullpp266"])
+    site.home.component("yn", level, prereqs=prereqs)
+    assert site.install(Patch("yn").file("bin/tool")) == site.done()
