@@ -19,6 +19,7 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   addStatus(*application, invocation);
   addHistory(*application, invocation);
   addVerify(*application, invocation);
+  addLog(*application, invocation);
   return application;
 }
 

@@ -24,11 +24,16 @@ InputFile::InputFile(const std::string &path) : path_(path), file_(path.c_str(),
       return;
     cannotRead(path, error);
   }
-  struct stat status = {};
-  if (fstat(file_.get(), &status) != 0)
-    cannotRead(path, errno);
-  if (!S_ISREG(status.st_mode))
+  if (!S_ISREG(status().st_mode))
     throw JudgementError("no regular file: " + path);
+}
+
+/// All zeros for a file that does not exist.
+struct stat InputFile::status() const {
+  struct stat status = {};
+  if (exists() && fstat(file_.get(), &status) != 0)
+    cannotRead(path_, errno);
+  return status;
 }
 
 std::size_t InputFile::read(char *buffer, std::size_t size) const {
@@ -52,12 +57,11 @@ std::string InputFile::content(std::size_t limit) const {
 }
 
 std::uint64_t InputFile::size() const {
-  struct stat status = {};
-  if (!exists())
-    return 0;
-  if (fstat(file_.get(), &status) != 0)
-    cannotRead(path_, errno);
-  return static_cast<std::uint64_t>(status.st_size);
+  return static_cast<std::uint64_t>(status().st_size);
+}
+
+std::time_t InputFile::modified() const {
+  return status().st_mtime;
 }
 
 void InputFile::seek(std::uint64_t position) const {
@@ -66,8 +70,9 @@ void InputFile::seek(std::uint64_t position) const {
 }
 
 bool InputFile::isStillThere() const {
-  struct stat mine = {};
   struct stat named = {};
-  return exists() && fstat(file_.get(), &mine) == 0 && stat(path_.c_str(), &named) == 0 &&
-         mine.st_dev == named.st_dev && mine.st_ino == named.st_ino;
+  if (!exists() || stat(path_.c_str(), &named) != 0)
+    return false;
+  const struct stat mine = status();
+  return mine.st_dev == named.st_dev && mine.st_ino == named.st_ino;
 }

@@ -4,7 +4,10 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <ctime>
 #include <string>
+
+#include <sys/stat.h>
 
 #include "filedescriptor.h"
 
@@ -21,12 +24,16 @@ public:
   std::string content(std::size_t limit) const;
   /// Size now, in bytes.
   std::uint64_t size() const;
+  /// When it was last written to, seconds since the epoch.
+  std::time_t modified() const;
   /// Goes on reading `position` bytes behind the start.
   void seek(std::uint64_t position) const;
   /// Whether the path still leads to this file: a log is rotated by renaming it.
   bool isStillThere() const;
 
 private:
+  struct stat status() const;
+
   std::string path_;
   FileDescriptor file_;
 };

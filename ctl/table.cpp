@@ -13,32 +13,38 @@ std::size_t widthOf(const std::string &text) {
   }));
 }
 
-std::string lineOf(const std::vector<std::string> &cells, const std::vector<std::size_t> &widths) {
-  std::string line;
-  for (std::size_t i = 0; i < cells.size(); ++i)
-    line += cells[i] + std::string(widths[i] + 2 - widthOf(cells[i]), ' ');
-  line.erase(line.find_last_not_of(' ') + 1);
-  return line;
-}
-
 } // namespace
 
-Table::Table(std::vector<std::string> heading) {
-  rows_.push_back(std::move(heading));
+Columns::Columns(std::vector<std::string> heading) : heading_(std::move(heading)), widths_(heading_.size()) {
+  measure(heading_);
 }
 
+void Columns::measure(const std::vector<std::string> &cells) {
+  for (std::size_t i = 0; i < std::min(cells.size(), widths_.size()); ++i)
+    widths_[i] = std::max(widths_[i], widthOf(cells[i]));
+}
+
+void Columns::print(const std::vector<std::string> &cells) const {
+  std::string line;
+  for (std::size_t i = 0; i < std::min(cells.size(), widths_.size()); ++i) {
+    const std::size_t width = widthOf(cells[i]);
+    line += cells[i] + std::string(std::max(widths_[i], width) + 2 - width, ' ');
+  }
+  line.erase(line.find_last_not_of(' ') + 1);
+  printf("%s\n", line.c_str());
+}
+
+Table::Table(std::vector<std::string> heading) : columns_(std::move(heading)) {}
+
 void Table::add(std::vector<std::string> cells) {
-  cells.resize(rows_.front().size());
+  columns_.measure(cells);
   rows_.push_back(std::move(cells));
 }
 
 void Table::print() const {
   if (isEmpty())
     return;
-  std::vector<std::size_t> widths(rows_.front().size());
+  columns_.printHeading();
   for (const std::vector<std::string> &row : rows_)
-    for (std::size_t i = 0; i < row.size(); ++i)
-      widths[i] = std::max(widths[i], widthOf(row[i]));
-  for (const std::vector<std::string> &row : rows_)
-    printf("%s\n", lineOf(row, widths).c_str());
+    columns_.print(row);
 }

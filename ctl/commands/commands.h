@@ -10,3 +10,4 @@ void addShow(CLI::App &application, Invocation &invocation);
 void addStatus(CLI::App &application, Invocation &invocation);
 void addHistory(CLI::App &application, Invocation &invocation);
 void addVerify(CLI::App &application, Invocation &invocation);
+void addLog(CLI::App &application, Invocation &invocation);

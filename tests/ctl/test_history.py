@@ -128,7 +128,7 @@ def test_what_was_taken_back(ctl, home, lines, transaction):
 
 @pytest.mark.parametrize("content", (b"", b"{", b"[]", b'{"id": 5}', b'{"id": "a", "started": "now"}', b"\xff\xfe",
                                      b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": 7}',
-                                     b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": [null, {"product": 1}]}'))
+                                     b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": [0, {"product": 1}]}'))
 def test_a_damaged_record_is_passed_over(ctl, home, lines, content):
     lines(line("in it"))
     home.write("patchlogs/transactions/a/record.json", content)
