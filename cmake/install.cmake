@@ -51,3 +51,7 @@ install(FILES packaging/lintian-overrides
   DESTINATION ${CMAKE_INSTALL_DATADIR}/lintian/overrides RENAME orvpatch COMPONENT debian EXCLUDE_FROM_ALL)
 
 add_custom_target(shared_files ALL DEPENDS ${shared_files})
+
+if(ORVPATCH_CTL)
+  include(${CMAKE_CURRENT_LIST_DIR}/installctl.cmake)
+endif()

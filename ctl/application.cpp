@@ -20,6 +20,7 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   addHistory(*application, invocation);
   addVerify(*application, invocation);
   addLog(*application, invocation);
+  addCompletion(*application, invocation);
   return application;
 }
 

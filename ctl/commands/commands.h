@@ -11,3 +11,4 @@ void addStatus(CLI::App &application, Invocation &invocation);
 void addHistory(CLI::App &application, Invocation &invocation);
 void addVerify(CLI::App &application, Invocation &invocation);
 void addLog(CLI::App &application, Invocation &invocation);
+void addCompletion(CLI::App &application, Invocation &invocation);

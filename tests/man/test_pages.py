@@ -8,7 +8,7 @@ import pytest
 from man.pages import FOLDER, read_page, source
 from support import Patch
 
-PAGES = ["orvpatch.8", "patch.ini.5", "orvpatch-archive.5", "orv-registry.5", "patches.hist.5"]
+PAGES = ["orvpatch.8", "orvpatchctl.8", "patch.ini.5", "orvpatch-archive.5", "orv-registry.5", "patches.hist.5"]
 ROOT = FOLDER.parent
 
 

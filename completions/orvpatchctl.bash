@@ -1,0 +1,65 @@
+# Completion of orvpatchctl for bash. Made by "orvpatchctl completion bash".
+
+_orvpatchctl_offer() {
+  compopt -o filenames 2>/dev/null
+  mapfile -t COMPREPLY < <(compgen "$1" -- "$2")
+}
+
+_orvpatchctl() {
+  local word=$2 previous=$3 command='' options='' count=0 place
+  local -a kinds=()
+  COMPREPLY=()
+  # The value of an option.
+  case $previous in
+    --color)
+      mapfile -t COMPREPLY < <(compgen -W 'auto always never' -- "$word")
+      return
+      ;;
+    --product | --since)
+      :
+      return
+      ;;
+  esac
+  # The command, and the number of its arguments before the cursor.
+  for ((place = 1; place < COMP_CWORD; place++)); do
+    case ${COMP_WORDS[place]} in
+      --color | --product | --since) ((place++)) ;;
+      -*) ;;
+      *) if [[ -z $command ]]; then command=${COMP_WORDS[place]}; else ((count++)); fi ;;
+    esac
+  done
+  case $command in
+    '')
+      options='--help --version'
+      ;;
+    show)
+      options='--help --json --color'
+      kinds=(f)
+      ;;
+    status)
+      options='--help --json --color'
+      kinds=(d)
+      ;;
+    history)
+      options='--help --json --color --product --failed --since'
+      kinds=(d)
+      ;;
+    verify)
+      options='--help --json --color'
+      kinds=(d f)
+      ;;
+    log)
+      options='--help --json --color --errors --steps --follow'
+      kinds=(d -)
+      ;;
+  esac
+  if [[ $word == -* ]]; then
+    mapfile -t COMPREPLY < <(compgen -W "$options" -- "$word")
+  elif [[ -z $command ]]; then
+    mapfile -t COMPREPLY < <(compgen -W 'show status history verify log' -- "$word")
+  elif [[ ${kinds[count]:--} != - ]]; then
+    _orvpatchctl_offer "-${kinds[count]}" "$word"
+  fi
+}
+
+complete -F _orvpatchctl orvpatchctl
