@@ -2,9 +2,7 @@
 
 import pytest
 
-pytest.register_assert_rewrite("loglines")  # its assertions then show what differs, like those of the cases
-
-from productsite import Site  # noqa: E402  (after the line above, which must come first)
+from productsite import Site
 
 
 @pytest.fixture

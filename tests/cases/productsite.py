@@ -7,7 +7,7 @@ import time
 
 from support import Patch, Result
 
-from catalogue import text
+from support.catalogue import text
 
 USAGE = (
     "\nUsage: orvpatch -h <ORV home> [OPTIONS]\n\n"

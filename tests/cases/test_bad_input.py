@@ -6,7 +6,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
+from support.catalogue import text
 from productsite import SUCCESS
 
 LIMIT = 1023  # no text of the catalogue is longer once it is filled

@@ -4,8 +4,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
-from loglines import trace
+from support.catalogue import text
 from productsite import SUCCESS, bad_home, usage
 
 VALID = Patch("ox").descriptor_text()
@@ -113,5 +112,7 @@ def test_the_self_check_always_succeeds(site, first):
     assert (result.status, result.out) == (0, (banner + SUCCESS).encode())
     assert result.err.startswith(b"Can't initialize patch processor, Error: ")
     argv = [*site.program.argv[-1:], first, site.home.path, "-utest"]
-    assert site.log()[:5] == trace("main", "main entry", *[f"arg[{at}]: {word}" for at, word in enumerate(argv)])
+    assert site.log()[:5] == [
+        ("TRACE", "main", message)
+        for message in ["main entry", *[f"arg[{at}]: {word}" for at, word in enumerate(argv)]]]
     assert site.log()[-2:] == [("INFO", "main", text("MAIN_SUCCESSFUL")), ("TRACE", "main", "main = 0")]

@@ -6,7 +6,7 @@ What counts is what stands in the cases themselves, not in their helpers.
 import ast
 from pathlib import Path
 
-from catalogue import TEXTS
+from support.catalogue import TEXTS
 
 UNREACHABLE = {
     "PP_CAB_EXTRACT": "belongs to compressed archives, which this version does not unpack",

@@ -6,7 +6,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
+from support.catalogue import text
 
 HOST = os.uname().nodename.split(".")[0]
 

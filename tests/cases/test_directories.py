@@ -6,7 +6,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
+from support.catalogue import text
 
 KINDS = [("zt", "vecm"), ("qa", "vems"), ("pt", "veps"), ("dk", "vepd"), ("ox", "vema")]  # in order of application
 

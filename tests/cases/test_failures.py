@@ -14,7 +14,7 @@ import pytest
 
 from support import Patch, stubs
 
-from catalogue import text
+from support.catalogue import text
 
 OX, UL, YN, QA = "Linux OS", "UNIX Logs", "Yellow Net", "Monitoring Server"
 RESULT_FILE = "vmaorv6/agentdepot/rc.txt"

@@ -8,7 +8,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
+from support.catalogue import text
 
 HISTORY_HEADER = (
     "#" * 80 + "\n"

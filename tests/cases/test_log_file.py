@@ -9,11 +9,12 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
-from loglines import driver, joined, parse_descriptor, trace
+from support.catalogue import text
+from golden import golden, words_of
 from productsite import SUCCESS
+from test_log_lines import DESCRIPTOR
 
-VALID = Patch("ox").descriptor_text()
+VALID = DESCRIPTOR
 RULE = "=" * 78
 HEADER = re.compile(
     rf"{RULE}\n ORV Patch Log File\n   System Name: (.*)\n   User Name:   (.*)\n   Process ID:  (\d+)\n"
@@ -23,9 +24,7 @@ SHORT_LEVEL = {"ERROR": "ERROR", "INFO": "INFO ", "TRACE": "TRACE"}
 
 
 def validation_lines(site, path):
-    argv = [*site.program.argv[-1:], "-h", site.home.path, "-vi", path]
-    return driver(argv, joined(
-        parse_descriptor(path), trace("patchdescriptor.cpp", "PatchDescriptor::~PatchDescriptor entry")), 0)
+    return golden("validation", **words_of(site, GIVEN=path))
 
 
 def as_printed(lines):
@@ -34,7 +33,7 @@ def as_printed(lines):
 
 def without_times(printed):
     """What was printed, with neither time nor line number in the prefix, nor the address of a buffer."""
-    return re.sub(r"\(0x[0-9a-f]+\) exit", "(BUFFER) exit", PREFIX.sub(r"\1 (\2): ", printed))
+    return re.sub(r"\(0x[0-9a-f]+\) exit", "({BUFFER}) exit", PREFIX.sub(r"\1 (\2): ", printed))
 
 
 def test_a_run_writes_a_header_and_its_lines(site):

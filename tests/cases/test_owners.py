@@ -7,8 +7,7 @@ import pytest
 
 from support import Patch, stubs
 
-from catalogue import text
-from loglines import error, joined, trace
+from support.catalogue import text
 
 
 @pytest.fixture
@@ -85,8 +84,8 @@ def test_others_cannot_start_an_agent_of_another_user(ordinary):
     assert ordinary.home.level("yn") == "06100100" and ordinary.home.exists("bin/tool")
     log = ordinary.log()
     begin = log.index(("TRACE", "orvcomponent", "startInstance() entry"))
-    assert log[begin + 1:begin + 3] == joined(
-        error("orvcomponent", text("ERROR_START_CANT_SU", "root")), trace("orvcomponent", "startInstance() exit"))
+    assert log[begin + 1:begin + 3] == [
+        ("ERROR", "orvcomponent", text("ERROR_START_CANT_SU", "root")), ("TRACE", "orvcomponent", "startInstance() exit")]
 
 
 def test_others_cannot_start_the_os_agent_of_another_user(ordinary):

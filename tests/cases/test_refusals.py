@@ -7,7 +7,7 @@ import pytest
 
 from support import Patch, stubs
 
-from catalogue import text
+from support.catalogue import text
 
 LOADED = ["+ tmp/kox", "+ tmp/kox/patch.ini"]  # the descriptor stays in the temporary directory
 ACTIONS = ["-i", "-t"]

@@ -4,7 +4,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
+from support.catalogue import text
 
 OX, YN = "Monitoring Agent for Linux OS", "Yellow Net Agent"
 RULE = "=" * 70

@@ -4,7 +4,7 @@ import pytest
 
 from support import Patch
 
-from catalogue import text
+from support.catalogue import text
 
 INFO = ("[ProductInfo]\nproductCode = kox\npatchName = N\npatchDescriptiveName = T\nproductVer = 06\n"
         "productRel = 10\nproductMod = 00\nproductLvl = 01\n")

@@ -1,4 +1,4 @@
-"""What fails on demand: system calls, kills, full and foreign disks.
+"""What fails on demand: system calls, kills, signals, full and foreign disks.
 
 A run takes a sample of the faults that changes every day; its seed is printed. In the environment
     ORVPATCH_FAULTS=all           takes them all
@@ -12,11 +12,20 @@ import random
 
 import pytest
 
-from .check import Bench
+pytest.register_assert_rewrite("faults.states")  # its assertions then show what differs
+
+from .run import Bench  # noqa: E402
+from .scenario import SCENARIOS  # noqa: E402
+
+_KINDS = {5: "calls", 3: "kills", 2: "combinations"}  # by how many fields a name has
 
 
 def pytest_configure(config):
     config.addinivalue_line("markers", "faults: injects failures into the program, or kills it")
+    for name in Choice().only:
+        scenario = name.split(":")[0]
+        if name.count(":") + 1 not in _KINDS or scenario not in (*SCENARIOS, "combination"):
+            raise pytest.UsageError(f"ORVPATCH_FAULTS_ONLY: there is no fault of the name {name}")
 
 
 def pytest_report_header():
@@ -36,10 +45,14 @@ class Choice:
             return ", ".join(self.only)
         return "all" if self.all else f"a sample, ORVPATCH_FAULTS_SEED={self.seed}"
 
-    def of(self, faults, count):
-        """Those to take of `faults`, of which a sample has `count`."""
+    def of(self, kind, top, faults, count):
+        """Those to take of `faults`, of which a sample has `count`; their names begin with `top`."""
         if self.only:
-            return [fault for fault in faults if str(fault) in self.only]
+            asked = {name for name in self.only
+                     if _KINDS[name.count(":") + 1] == kind and name.split(":")[0] == top}
+            known = {str(fault) for fault in faults}
+            assert asked <= known, f"ORVPATCH_FAULTS_ONLY: there is no fault of the name {asked - known}"
+            return [fault for fault in faults if str(fault) in asked]
         return list(faults) if self.all else random.Random(self.seed).sample(faults, min(count, len(faults)))
 
 

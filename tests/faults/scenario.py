@@ -26,6 +26,12 @@ class PatchFacts(NamedTuple):
         return self.patch.code
 
     @property
+    def dependents(self):
+        """Product codes in the order in which their instances are stopped."""
+        codes = [f"k{code}" for code in self.patch.dependents]
+        return codes + [self.code] * (self.code not in codes)
+
+    @property
     def temp(self):
         return f"tmp/{self.patch.product}"
 
@@ -114,3 +120,5 @@ SCENARIOS = {scenario.name: scenario for scenario in (
     Scenario("report", "-t", [_agent_patch()], directory=False),
     Scenario("failure", "-i", [_agent_patch(fail_status=3)], directory=False),
 )}
+# The patch of the failure once its command is right.
+REPAIRED = Scenario("repaired", "-i", [_agent_patch()], directory=False)

@@ -6,7 +6,7 @@ import threading
 
 import pytest
 
-from cases.catalogue import text
+from support.catalogue import text
 from support import Patch, ProductHome
 
 from .conditions import fill, immutable, other_file_system, read_only, small_disk

@@ -5,10 +5,13 @@ import os
 import re
 from typing import NamedTuple
 
+from .calls import kind_of
+
 # The program's first own call; what precedes it is the dynamic loader's.
-_FIRST_OWN_CALL = re.compile(r'openat\(.*"/dev/null", O_RDWR\)')
+_FIRST_OWN_CALL = re.compile(r'open\w*\(.*"/dev/null", O_RDWR')
 _CALL = re.compile(r"^(\w+)\((.*)\)\s+= (\?|-?\w+)(.*)$")
-_QUOTED = re.compile(r'"((?:[^"\\]|\\.)*)"')
+# A string, and the directory that it is relative to where the call names one.
+_QUOTED = re.compile(r'(?:(?:\d+|AT_FDCWD)<([^>]*)>, )?"((?:[^"\\]|\\.)*)"')
 _DESCRIPTOR = re.compile(r"^(\d+)<([^>]*)>")
 _ERROR = re.compile(r"^ (E[A-Z0-9]+) ")
 _LOG_LINE = re.compile(r"^(?:ERROR|INFO |TRACE) \d\d:\d\d:\d\d \([^,()]*,\d+\): (.*)", re.MULTILINE)
@@ -19,6 +22,7 @@ class Call(NamedTuple):
     """One system call of the program. Its paths are absolute; an open descriptor's path is the only one of
     a call that takes a descriptor."""
 
+    kind: str        # what the call is for, see calls.py
     name: str
     ordinal: int     # among the calls of this name, the loader's included: what strace counts by
     paths: tuple
@@ -39,9 +43,9 @@ class Call(NamedTuple):
     @property
     def is_log(self):
         """Whether this call serves the log alone. Without a log file, lines go to standard output."""
-        if self.name in ("openat", "write", "close") and self.path.endswith(_LOG_FILE):
+        if self.path.endswith(_LOG_FILE):
             return True
-        return self.name == "write" and self.descriptor == 1 and bool(self.messages)
+        return self.kind == "write" and self.descriptor == 1 and bool(self.messages)
 
 
 def read_trace(path, cwd):
@@ -57,7 +61,7 @@ def read_trace(path, cwd):
         name = match[1]
         counts[name] = counts.get(name, 0) + 1
         call = _call(match, counts[name], cwd)
-        if call.name == "chdir" and not call.error:
+        if call.kind == "enter" and not call.error:
             cwd = call.path
         if own:
             calls.append(call)
@@ -66,14 +70,16 @@ def read_trace(path, cwd):
 
 def _call(match, ordinal, cwd):
     name, arguments, result, rest = match.groups()
-    descriptor = _DESCRIPTOR.match(arguments)
-    quoted = [_plain(text) for text in _QUOTED.findall(arguments)]
-    text = quoted[0] if name == "write" and quoted else ""
-    given = (descriptor[2],) if descriptor else tuple(quoted)
-    paths = given if descriptor else tuple(os.path.join(cwd, path) for path in given)
+    kind, descriptor = kind_of(name), _DESCRIPTOR.match(arguments)
+    quoted = [(top or cwd, _plain(text)) for top, text in _QUOTED.findall(arguments)]
+    text = quoted[0][1] if kind == "write" and quoted else ""
+    if kind in ("read", "write"):
+        quoted = []
+    given = tuple(text for _, text in quoted) or ((descriptor[2],) if descriptor else ())
+    paths = tuple(os.path.join(top, text) for top, text in quoted) or given
     error = _ERROR.match(rest)
     return Call(
-        name, ordinal, paths, given, arguments,
+        kind, name, ordinal, paths, given, arguments,
         int(descriptor[1]) if descriptor else None, text, _number(result), error[1] if error else "",
         rest.endswith("(INJECTED)"), tuple(_LOG_LINE.findall(text)), cwd)
 
