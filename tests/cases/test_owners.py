@@ -85,7 +85,8 @@ def test_others_cannot_start_an_agent_of_another_user(ordinary):
     log = ordinary.log()
     begin = log.index(("TRACE", "orvcomponent", "startInstance() entry"))
     assert log[begin + 1:begin + 3] == [
-        ("ERROR", "orvcomponent", text("ERROR_START_CANT_SU", "root")), ("TRACE", "orvcomponent", "startInstance() exit")]
+        ("ERROR", "orvcomponent", text("ERROR_START_CANT_SU", "root")),
+        ("TRACE", "orvcomponent", "startInstance() exit")]
 
 
 def test_others_cannot_start_the_os_agent_of_another_user(ordinary):

@@ -6,7 +6,6 @@ import tarfile
 from datetime import datetime
 
 from support import parse_log, remove_tree, scratch_folder
-from support.catalogue import text
 from support.snapshot import snapshot
 
 from .allowance import Allowance

@@ -82,7 +82,7 @@ def _header(match):
 
 def _lines(text):
     lines = []
-#A message that ends in a line feed leaves an empty line behind it : only the last "\n" is the log's.
+    # A message that ends in a line feed leaves an empty line behind it: only the last "\n" is the log's.
     for row in text.removesuffix("\n").split("\n") if text else []:
         prefix = _PREFIX.match(row)
         if prefix:
