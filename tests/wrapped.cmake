@@ -41,6 +41,7 @@ list(TRANSFORM wrapped_calls PREPEND "LINKER:--wrap=" OUTPUT_VARIABLE wrap_optio
 
 add_executable(wrapped_tests ${wrapped_tests} ${support} support/systemcalls.cpp)
 target_include_directories(wrapped_tests PRIVATE support)
+target_compile_definitions(wrapped_tests PRIVATE ${support_folder})
 target_link_libraries(wrapped_tests PRIVATE orvpatch_core GTest::gmock GTest::gtest_main)
 target_link_options(wrapped_tests PRIVATE ${wrap_options})
 orvpatch_test_code(wrapped_tests)

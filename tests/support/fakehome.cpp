@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <sstream>
 
 #include <unistd.h>
 
@@ -26,16 +27,26 @@ esac
 while IFS= read -r line; do printf '%s\n' "$line"; done <"$shown"
 )";
 
-const char *const ControlScript = R"(#!/bin/sh
-home=${0%/bin/*}
-call=${0##*/}
-for argument in "$@"; do call="$call [$argument]"; done
-printf '%s\n' "$call" >>"$home/journal"
-[ ! -f "$home/behaviour/$call" ] || . "$home/behaviour/$call"
-)";
-
 std::string nameOfUser(const std::string &owner) {
   return owner == RunRow::currentUser ? Util::getUserName() : owner;
+}
+
+/// A call in short: program and arguments of a line of the control scripts' journal; any other line is itself.
+std::string callIn(const std::string &line) {
+  constexpr char Separator = '\x1f';
+  constexpr int FieldsBeforeArguments = 5;
+  std::istringstream fields(line);
+  std::string call;
+  int number = 0;
+  for (std::string field; std::getline(fields, field, Separator); ++number) {
+    if (number == 0)
+      call = field;
+    else if (number >= FieldsBeforeArguments)
+      call += " [" + field + "]";
+  }
+  if (!line.empty() && line.back() == Separator)
+    call += " []";
+  return call;
 }
 
 } // namespace
@@ -94,8 +105,9 @@ LogLines traces(const std::string &component, const std::vector<std::string> &me
 
 void FakeHome::SetUp() {
   ScratchHome::SetUp();
-  write("bin/QuillAgent", ControlScript, Executable);
-  write("bin/QuillServer", ControlScript, Executable);
+  makeDirectory("bin");
+  fs::copy(SUPPORT_FOLDER "/quill", home() + "bin");
+  makeDirectory("control/answers");
   write("ps/ps", PsScript, Executable);
   // Not the caller's PATH: a folder on it that the user may not enter changes the error number of a program
   // that is nowhere.
@@ -135,14 +147,14 @@ void FakeHome::setPsOfAll(const std::string &text) const {
 }
 
 void FakeHome::onCall(const std::string &call, const std::string &shell) const {
-  write("behaviour/" + call, shell + "\n");
+  write("control/answers/" + call, "home=$quill_home\n" + shell + "\n");
 }
 
 std::vector<std::string> FakeHome::journal() const {
   std::ifstream in(home() + "journal");
   std::vector<std::string> lines;
   for (std::string line; std::getline(in, line);)
-    lines.push_back(line);
+    lines.push_back(callIn(line));
   return lines;
 }
 

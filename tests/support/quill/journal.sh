@@ -12,12 +12,24 @@ journal() {
   [ -z "${QUILL_UNJOURNALED-}" ] || return 0
   us=$(printf '\037')
   line="$1$us$(user_name)$us$(pwd)$us$PATH$us${QUILLHOME-}"
+  call=$1
   shift
   for argument in "$@"; do
     line="$line$us$argument"
+    call="$call [$argument]"
   done
   printf '%s\n' "$line" >>"$quill_home/journal"
   save_watched
+  answer "$call"
+}
+
+# answer CALL: in a home with control/answers no instance is real. A call such as "QuillAgent [stop] [ox]" runs the
+# shell text of this name there, if there is one, and that is all.
+answer() {
+  [ -d "$quill_home/control/answers" ] || return 0
+  # shellcheck disable=SC1090
+  [ ! -f "$quill_home/control/answers/$1" ] || . "$quill_home/control/answers/$1"
+  exit 0
 }
 
 # save_watched: copies the files listed in control/watch to control/seen/<line of the journal>/.
