@@ -1,6 +1,8 @@
 """The program killed before one of its calls, and the states in which that may leave the home."""
 
+import contextlib
 import os
+import signal
 import time
 from pathlib import Path
 from typing import NamedTuple
@@ -74,24 +76,29 @@ def _changes(call, context):
 
 
 def settle(home, seconds=30):
-    """Waits until the children of a killed program have ended; the agents that they started live on."""
+    """Waits until the children of a killed program have ended; the agents that they started live on. An agent whose
+    control script was killed before it had recorded it is ended: no record leads to it."""
     limit = time.monotonic() + seconds
-    while _children(home):
+    while children := _children(home):
+        for pid in children:
+            if f"{home.path}/control/processes/".encode() in _read(pid, "cmdline"):
+                with contextlib.suppress(ProcessLookupError):
+                    os.kill(pid, signal.SIGKILL)
         if time.monotonic() > limit:
-            raise TimeoutError(f"children of the killed program still run: {_children(home)}")
+            raise TimeoutError(f"children of the killed program still run: {children}")
         time.sleep(0.01)
 
 
 def _children(home):
     started = set(map(int, home.read("control/started").split()))
     mark = f"\0QUILLHOME={home.prefix}\0".encode()
-    return [int(entry.name) for entry in os.scandir("/proc")
-            if entry.name.isdigit() and int(entry.name) not in started and mark in _environment(entry.path)]
+    return [int(name) for name in os.listdir("/proc")
+            if name.isdigit() and int(name) not in started and mark in b"\0" + _read(name, "environ")]
 
 
-def _environment(process):
+def _read(pid, file):
     try:
-        return b"\0" + Path(process, "environ").read_bytes()
+        return Path("/proc", str(pid), file).read_bytes()
     except OSError:
         return b""
 

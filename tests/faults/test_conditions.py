@@ -219,7 +219,7 @@ def test_tmp_is_a_link_to_nothing(program, agent_home, scratch, patch_dir):
 
 @pytest.fixture
 def foreign(scratch):
-    """A directory that is none of the product's, to which somebody has planted a link."""
+    """A directory that is none of the product's, with a planted link to it."""
     folder = scratch / "foreign"
     (folder / "sub").mkdir(parents=True)
     (folder / "file").write_bytes(OLD)

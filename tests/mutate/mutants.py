@@ -29,7 +29,8 @@ class Mutant(NamedTuple):
 
 
 OPERATORS = [("==", "!="), ("!=", "=="), ("<=", "<"), (">=", ">"), (" < ", " <= "), (" > ", " >= "),
-             (" && ", " || "), (" || ", " && "), (" + ", " - "), (" - ", " + "), ("+= ", "= "), ("++i", "--i"), ("!", "")]
+             (" && ", " || "), (" || ", " && "), (" + ", " - "), (" - ", " + "), ("+= ", "= "), ("++i", "--i"),
+             ("!", "")]
 # Operations that take the place of each other.
 NEIGHBOURS = [("find", "rfind"), ("find_first_of", "find_last_of"), ("find_first_not_of", "find_last_not_of"),
               ("front", "back"), ("stat", "lstat"), ("min", "max"), ("lower_bound", "upper_bound"),
@@ -167,7 +168,8 @@ def file_mutants(root, path):
         if not is_code(line):
             continue
         code, following = code_part(line), code_part(lines[number]) if number < len(lines) else ""
-        changes = [(line, *change) for change in line_mutants(code, variables_at(lines, number, path if "::" in function else None))]
+        variables = variables_at(lines, number, path if "::" in function else None)
+        changes = [(line, *change) for change in line_mutants(code, variables)]
         changes += [(f"{code}\n{following}", *change) for change in swap_mutants(code, following)]
         for before, kind, change, after in changes:
             strings += kind == "string"
