@@ -31,7 +31,8 @@ std::string nameOfUser(const std::string &owner) {
   return owner == RunRow::currentUser ? Util::getUserName() : owner;
 }
 
-/// A call in short: program and arguments of a line of the control scripts' journal; any other line is itself.
+/// A call in short: program and arguments of a line of the control scripts' journal; any other line is
+/// itself.
 std::string callIn(const std::string &line) {
   constexpr char Separator = '\x1f';
   constexpr int FieldsBeforeArguments = 5;

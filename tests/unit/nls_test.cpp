@@ -32,14 +32,13 @@ std::string conversionsOf(const std::string &text) {
 std::vector<CatalogueEntry> readCatalogue() {
   std::ifstream in(SUPPORT_FOLDER "/catalogue.json");
   std::vector<CatalogueEntry> entries;
-  for (const auto &item : nlohmann::json::parse(in).items()) {
+  const nlohmann::json catalogue = nlohmann::json::parse(in);
+  for (const auto &item : catalogue.items()) {
     const std::string text = item.value().get<std::string>();
     entries.push_back({item.key(), text, conversionsOf(text)});
   }
   return entries;
 }
-
-const std::vector<CatalogueEntry> Catalogue = readCatalogue();
 
 // Read before main, so that no test has changed it yet.
 const bool filledAtStart = glbInitialized;
@@ -91,12 +90,12 @@ TEST_P(CatalogueTest, EachArgumentStandsAtItsPlace) {
   EXPECT_EQ(formattedWith(GetParam().arguments, GetParam().key.c_str()), expected);
 }
 
-INSTANTIATE_TEST_SUITE_P(AllEntries, CatalogueTest, ::testing::ValuesIn(Catalogue),
+INSTANTIATE_TEST_SUITE_P(AllEntries, CatalogueTest, ::testing::ValuesIn(readCatalogue()),
                          [](const auto &entry) { return entry.param.key; });
 
 TEST(CatalogueTableTest, ListsSixtyTwoKeysOnce) {
   std::set<std::string> keys;
-  for (const CatalogueEntry &entry : Catalogue)
+  for (const CatalogueEntry &entry : readCatalogue())
     keys.insert(entry.key);
   EXPECT_EQ(keys.size(), 62U);
 }
