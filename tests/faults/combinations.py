@@ -113,7 +113,7 @@ class Combination:
             run.again([self.second_kill])
             settle(run.home)
             aftermath = Aftermath(bench, run.home, run.before)
-            aftermath.check()
+            aftermath.check(repeated=True)
         aftermath.check_repetition()
 
 

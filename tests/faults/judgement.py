@@ -276,7 +276,7 @@ class _Judgement:
         reached = self.scenario.action == "-i" and "level" in entered
         wanted = {new if reached and failed != "level" else old}
         if reached and "level" in self.allowed:
-            wanted |= {old, new, b""}
+            wanted |= {old, new}
         entry = self.tree[facts.version_file]
         if entry.content not in wanted or entry[:1] + entry[1:4] != _facts(self.run.before[facts.version_file]):
             yield f"{facts.version_file}: expected {wanted}, found {entry}"
