@@ -7,7 +7,7 @@ import pytest
 
 from support import Patch, ProductHome, remove_tree, stubs
 
-from catalogue import text
+from support.catalogue import text
 from productsite import Running, Site
 
 
