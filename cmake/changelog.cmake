@@ -1,5 +1,7 @@
 # The change logs that the package formats ask for, made of the newest entry of CHANGELOG.md. Its release must
-# be the one that is built.
+# be the one that is built, or the one that a build between two releases leads to.
+
+set(ORVPATCH_PACKAGE_VERSION ${PROJECT_VERSION} CACHE STRING "Version of the packages: see packaging/version")
 
 file(STRINGS ${CMAKE_SOURCE_DIR}/CHANGELOG.md headings REGEX "^## ")
 list(GET headings 0 newest)
@@ -17,14 +19,14 @@ endfunction()
 set(ORVPATCH_MAINTAINER "orvpatch maintainers <orvpatch@norvik.example>")
 orvpatch_release_date(debian_date "%a, %d %b %Y %T +0000")
 file(CONFIGURE OUTPUT ${CMAKE_BINARY_DIR}/changelog.Debian @ONLY CONTENT
-"orvpatch (@PROJECT_VERSION@-1) stable; urgency=medium
+"orvpatch (@ORVPATCH_PACKAGE_VERSION@-1) stable; urgency=medium
 
-  * Release @PROJECT_VERSION@; changelog.gz tells what is new.
+  * Release @ORVPATCH_PACKAGE_VERSION@; changelog.gz tells what is new.
 
  -- @ORVPATCH_MAINTAINER@  @debian_date@
 ")
 orvpatch_release_date(rpm_date "%a %b %d %Y")
 file(CONFIGURE OUTPUT ${CMAKE_BINARY_DIR}/changelog.rpm @ONLY CONTENT
-"* @rpm_date@ @ORVPATCH_MAINTAINER@ - @PROJECT_VERSION@-1
-- Release @PROJECT_VERSION@; CHANGELOG.md tells what is new.
+"* @rpm_date@ @ORVPATCH_MAINTAINER@ - @ORVPATCH_PACKAGE_VERSION@-1
+- Release @ORVPATCH_PACKAGE_VERSION@; CHANGELOG.md tells what is new.
 ")

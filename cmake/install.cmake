@@ -31,9 +31,26 @@ install(FILES completions/orvpatch.bash
   DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME orvpatch COMPONENT program)
 install(FILES completions/orvpatch.fish
   DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d COMPONENT program)
-install(FILES README.md SECURITY.md DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT program OPTIONAL)
-install(DIRECTORY docs/ DESTINATION ${CMAKE_INSTALL_DOCDIR}/docs COMPONENT program
-  FILES_MATCHING PATTERN "*.md" PATTERN "*.svg" PATTERN release.md EXCLUDE)
+install(FILES packaging/orvpatch.logrotate DESTINATION ${CMAKE_INSTALL_DOCDIR}/examples COMPONENT program)
+
+# The documents and their pictures, but for what only those who release need; what is linked and not installed
+# becomes plain text.
+file(GLOB documents RELATIVE ${CMAKE_SOURCE_DIR} CONFIGURE_DEPENDS README.md SECURITY.md docs/*.md docs/*.svg)
+list(REMOVE_ITEM documents docs/release.md)
+foreach(document ${documents})
+  get_filename_component(folder ${document} DIRECTORY)
+  if(document MATCHES "\\.svg$")
+    install(FILES ${document} DESTINATION ${CMAKE_INSTALL_DOCDIR}/${folder} COMPONENT program)
+    continue()
+  endif()
+  set(page ${CMAKE_BINARY_DIR}/share/doc/${document})
+  add_custom_command(OUTPUT ${page}
+    COMMAND ${CMAKE_COMMAND} -E make_directory ${CMAKE_BINARY_DIR}/share/doc/${folder}
+    COMMAND ${CMAKE_SOURCE_DIR}/packaging/installed-page ${document} ${documents} > ${page}
+    DEPENDS ${document} packaging/installed-page VERBATIM)
+  list(APPEND shared_files ${page})
+  install(FILES ${page} DESTINATION ${CMAKE_INSTALL_DOCDIR}/${folder} COMPONENT program)
+endforeach()
 
 install(FILES completions/_orvpatch
   DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions COMPONENT site)

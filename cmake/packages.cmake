@@ -12,6 +12,10 @@ else()
   return()
 endif()
 
+# The debug symbols are packed apart: the packages hold a stripped program.
+target_compile_options(orvpatch_core PRIVATE -g)
+target_compile_options(orvpatch PRIVATE -g)
+
 # The C library's level that the program asks for, kept beside it for the packages to name.
 add_custom_command(TARGET orvpatch POST_BUILD VERBATIM
   COMMAND ${CMAKE_SOURCE_DIR}/packaging/libc-level ${CMAKE_OBJDUMP} $<TARGET_FILE:orvpatch> > libc-level
@@ -22,12 +26,15 @@ set(CPACK_PACKAGE_VENDOR "Norvik")
 set(CPACK_PACKAGE_CONTACT "${ORVPATCH_MAINTAINER}")
 set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "patch installer of the ORV monitoring product")
 set(CPACK_PACKAGE_DESCRIPTION_FILE ${CMAKE_SOURCE_DIR}/packaging/description)
-set(CPACK_PACKAGE_FILE_NAME orvpatch-${PROJECT_VERSION}-linux-${CMAKE_SYSTEM_PROCESSOR})
+set(CPACK_PACKAGE_VERSION ${ORVPATCH_PACKAGE_VERSION})
+set(CPACK_PACKAGE_FILE_NAME orvpatch-${ORVPATCH_PACKAGE_VERSION}-linux-${CMAKE_SYSTEM_PROCESSOR})
 set(CPACK_PACKAGE_DIRECTORY ${CMAKE_BINARY_DIR}/packages)
 # Settings that differ by the kind of package, and what is done to the files before they are packed.
 set(CPACK_PROJECT_CONFIG_FILE ${CMAKE_SOURCE_DIR}/packaging/kinds.cmake)
 set(CPACK_PRE_BUILD_SCRIPTS ${CMAKE_SOURCE_DIR}/packaging/staged.cmake)
 set(CPACK_ORVPATCH_STRIP ${CMAKE_STRIP})
+set(CPACK_ORVPATCH_OBJCOPY ${CMAKE_OBJCOPY})
+set(CPACK_ORVPATCH_READELF ${CMAKE_READELF})
 
 # The .tar.gz is made by a script: cpack's own would hold the files in the order of the disk.
 set(CPACK_EXTERNAL_ENABLE_STAGING ON)
@@ -43,7 +50,7 @@ set(CPACK_RPM_FILE_NAME RPM-DEFAULT)
 set(CPACK_RPM_PACKAGE_RELEASE 1)
 set(CPACK_RPM_PACKAGE_GROUP "System Environment/Base")
 set(CPACK_RPM_PACKAGE_LICENSE "LicenseRef-Proprietary")
-set(CPACK_RPM_PACKAGE_RELOCATABLE OFF)
+set(CPACK_PACKAGE_RELOCATABLE OFF) # this alone: the one for .rpm files cannot take it back
 # Folders that belong to the system or to the shells.
 foreach(folder sbin share/bash-completion share/bash-completion/completions share/fish
     share/fish/vendor_completions.d share/man share/man/man5 share/man/man8 share/zsh share/zsh/site-functions)

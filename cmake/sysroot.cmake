@@ -14,7 +14,9 @@ function(orvpatch_sysroot preset triplet)
   set(headers ${sysroot}/usr/${triplet}/include)
   # -B: start files and libraries are looked for there first. --sysroot: so are those that libc.so names.
   # The old library's std::function::swap reads what it has not set, so that the compiler warns.
-  set(compile --sysroot=${sysroot} -Wno-uninitialized -Wno-maybe-uninitialized -nostdinc
+  # In debug symbols the libraries lie where they do by default, wherever they were unpacked to.
+  set(compile --sysroot=${sysroot} -ffile-prefix-map=${sysroot}=./build/sysroot/${preset}
+    -Wno-uninitialized -Wno-maybe-uninitialized -nostdinc
     -isystem${headers}/c++/10 -isystem${headers}/c++/10/${triplet} -isystem${compiler_headers} -isystem${headers})
   set(link --sysroot=${sysroot} -B${sysroot}/usr/lib/gcc-cross/${triplet}/10 -B${sysroot}/usr/${triplet}/lib)
   string(JOIN "\" \"" compile ${compile}) # quoted: the path may have blanks

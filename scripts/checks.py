@@ -113,8 +113,13 @@ def cases(name, paths, preset="dev", env=None, options=(), jobs=2):
 
 
 def checked_sources(*suffixes):
-    listed = subprocess.run(["git", "ls-files", *[f"*{suffix}" for suffix in suffixes]], cwd=ROOT,
-                            capture_output=True, text=True, check=True).stdout.split()
+    """A source archive is not under version control: there all files count but those that a build makes."""
+    if (ROOT / ".git").exists():
+        listed = subprocess.run(["git", "ls-files", *[f"*{suffix}" for suffix in suffixes]], cwd=ROOT,
+                                capture_output=True, text=True, check=True).stdout.splitlines()
+    else:
+        found = [str(path.relative_to(ROOT)) for suffix in suffixes for path in sorted(ROOT.rglob(f"*{suffix}"))]
+        listed = [name for name in found if not name.startswith(("build/", "dist/"))]
     return [path for path in listed if not path.startswith("tests/fuzz/corpus/")]
 
 

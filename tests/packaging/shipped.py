@@ -10,6 +10,7 @@ from pathlib import Path
 from typing import NamedTuple
 
 CHECKOUT = Path(__file__).resolve().parents[2]
+VERSION = "1.0.0~git20261121.0123456789ab"  # as of a commit between two releases
 EPOCH = 1795219200  # any moment; not that of a checkout or a build
 _SHIPPED = ["CMakeLists.txt", "CMakePresets.json", "cmake", "completions", "docs", "man", "packaging", "src",
             "CHANGELOG.md", "README.md", "SECURITY.md"]
@@ -35,11 +36,13 @@ AMD64 = Architecture(
     "x86_64", "amd64", "x86_64-linux-gnu", "Advanced Micro Devices X86-64",
     frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), "2.14",
     (f"{_AMD64_LIBRARIES}/ld-linux-x86-64.so.2", "--library-path", _AMD64_LIBRARIES),
-    ("orvpatch-{v}-linux-x86_64.tar.gz", "orvpatch_{v}-1_amd64.deb"))
+    ("orvpatch-{v}-linux-x86_64-debug.tar.gz", "orvpatch-{v}-linux-x86_64.tar.gz",
+     "orvpatch_{v}-1_amd64.deb"))
 PPC64LE = Architecture(
     "ppc64le", "ppc64el", "powerpc64le-linux-gnu", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}), "2.17",
     ("qemu-ppc64le", "-L", f"{SYSROOTS}/ppc64le/usr/powerpc64le-linux-gnu"),
-    ("orvpatch-{v}-1.ppc64le.rpm", "orvpatch-{v}-linux-ppc64le.tar.gz", "orvpatch_{v}-1_ppc64el.deb"))
+    ("orvpatch-{v}-1.ppc64le.rpm", "orvpatch-{v}-linux-ppc64le-debug.tar.gz", "orvpatch-{v}-linux-ppc64le.tar.gz",
+     "orvpatch_{v}-1_ppc64el.deb"))
 ARCHITECTURES = [AMD64, PPC64LE]
 
 
@@ -59,7 +62,11 @@ class Build(NamedTuple):
         return self.folder / "packages"
 
     def package(self, suffix):
-        return next(self.packages.glob(f"*{suffix}"))
+        return next(path for path in self.packages.glob(f"*{suffix}") if "-debug." not in path.name)
+
+    @property
+    def symbols(self):
+        return next(self.packages.glob("*-debug.tar.gz"))
 
 
 @functools.cache
@@ -69,6 +76,8 @@ def ship(architecture, folder, umask, **environment):
     source.mkdir(parents=True, exist_ok=True)
     with _locked(source.parent / f"{source.name}.lock"):
         _copy_sources(source)
+        if not (source / "VERSION").exists():
+            (source / "VERSION").write_text(f"{VERSION}\n")
         sysroots = _sysroots(architecture.preset, source)
         done = subprocess.run(["packaging/pack", architecture.preset], cwd=source, umask=umask, text=True,
                               stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, check=False,
@@ -96,16 +105,25 @@ def _locked(path):
         yield
 
 
+def checkout_files(*paths):
+    """Names of the files of the checkout below these paths, without what a build makes; a source archive is not under
+    version control and has nothing else."""
+    if (CHECKOUT / ".git").exists():
+        return subprocess.run(["git", "ls-files", "-co", "--exclude-standard", "--", *paths], cwd=CHECKOUT, check=True,
+                              capture_output=True, text=True).stdout.splitlines()
+    found = [path for name in paths for path in [CHECKOUT / name, *(CHECKOUT / name).rglob("*")]]
+    return [str(path.relative_to(CHECKOUT)) for path in found if path.is_file()]
+
+
 def _copy_sources(target):
     """Files keep their time where the content has not changed, so that a second run builds nothing."""
-    listed = subprocess.run(["git", "ls-files", "-co", "--exclude-standard", "--", *_SHIPPED], cwd=CHECKOUT,
-                            check=True, capture_output=True, text=True).stdout.split()
-    wanted = {Path(path) for path in listed if (CHECKOUT / path).is_file()}
+    listed = checkout_files(*_SHIPPED)
+    wanted = {Path(path) for path in listed if (CHECKOUT / path).is_file()} | {Path("VERSION")}
     for path in target.rglob("*"):
         relative = path.relative_to(target)
         if path.is_file() and relative.parts[0] != "build" and relative not in wanted:
             path.unlink()
-    for path in wanted:
+    for path in wanted - {Path("VERSION")}:
         content = (CHECKOUT / path).read_bytes()
         if not (target / path).exists() or (target / path).read_bytes() != content:
             (target / path).parent.mkdir(parents=True, exist_ok=True)

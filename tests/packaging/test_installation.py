@@ -1,11 +1,13 @@
 """Packages installed into an empty root, and the program in it run on a home of the sample product."""
 
+import re
 import shlex
 import subprocess
 
 import pytest
 
 from shipped import AMD64, CHECKOUT, PPC64LE
+from support import Patch, Program
 
 pytestmark = pytest.mark.packages
 
@@ -74,6 +76,53 @@ def test_installed_pages_can_be_read(prefix):
         done = subprocess.run(["mandoc", "-T", "ascii", page.relative_to(prefix / "share/man")], check=True,
                               cwd=prefix / "share/man", capture_output=True, text=True)
         assert "ORV" in done.stdout, page
+
+
+@in_every_way
+def test_installed_pages_hold_no_dead_link(prefix):
+    top = prefix / "share/doc/orvpatch"
+    targets = [(page, target) for page in sorted(top.rglob("*.md")) for target in links_of(page)]
+    assert (top / "README.md", "docs/recovery.md") in targets
+    assert [(page.name, target) for page, target in targets if not leads_somewhere(page, target)] == []
+
+
+def links_of(page):
+    found = re.findall(r"\]\(([^()\s]+)\)|(?:src|srcset|href)=\"([^\"]+)\"", page.read_text())
+    return [target for pair in found for target in pair if target and "://" not in target]
+
+
+def leads_somewhere(page, target):
+    name, _, anchor = target.partition("#")
+    linked = page.parent / name if name else page
+    if not anchor or linked.suffix != ".md":
+        return linked.exists()
+    titles = re.findall(r"^#+ (.*)$", linked.read_text(), re.M)
+    return anchor in [re.sub(r"[^\w -]", "", title.lower()).replace(" ", "-") for title in titles]
+
+
+@pytest.mark.parametrize("architecture, prefix", [(AMD64, by_tar)], indirect=True, ids=["x86_64"])
+def test_example_rotates_the_log_and_spares_the_history(prefix, build, home, patch_dir, tmp_path):
+    """Two installations with a rotation between them: the second begins a new log and goes on in the history."""
+    program = Program(prefix / "sbin/orvpatch", build.architecture.runner)
+    home.component("xe")
+    made = Patch("xe", level="06100001").file("bin/kxeagent").write(patch_dir)
+    assert program.install(home, made).status == 0
+    log, history = home.path / "patchlogs/orvpatch.log", home.path / "patchlogs/patches.hist"
+    first_log, first_history = log.read_bytes(), history.read_bytes()
+
+    example = (prefix / "share/doc/orvpatch/examples/orvpatch.logrotate").read_text()
+    assert re.findall(r"^/\S+", example, re.M) == ["/opt/orv/patchlogs/orvpatch.log"]
+    rotation = tmp_path / "rotation"
+    rotation.write_text(example.replace("/opt/orv", str(home.path)))
+    rotation.chmod(0o644)
+    run("logrotate", "--force", "--state", tmp_path / "state", rotation)
+    assert not log.exists()
+    assert (home.path / "patchlogs/orvpatch.log.1").read_bytes() == first_log
+    assert history.read_bytes() == first_history
+
+    assert program.install(home, made).status == 0
+    assert log.exists()
+    assert history.read_bytes().startswith(first_history)
 
 
 def test_installed_by_cmake_below_a_prefix(build, tmp_path):

@@ -6,14 +6,15 @@ import tarfile
 
 import pytest
 
-from shipped import CHECKOUT, EPOCH, PPC64LE
+from shipped import CHECKOUT, EPOCH, PPC64LE, VERSION
 
 pytestmark = pytest.mark.packages
 
 PAGES = ["man5/orv-registry.5.gz", "man5/orvpatch-archive.5.gz", "man5/orvpatch.log.5.gz", "man5/patch.ini.5.gz",
          "man5/patches.hist.5.gz", "man8/orvpatch.8.gz"]
 EVERYWHERE = {"sbin/orvpatch", "share/bash-completion/completions/orvpatch",
-              "share/fish/vendor_completions.d/orvpatch.fish", *(f"share/man/{page}" for page in PAGES)}
+              "share/fish/vendor_completions.d/orvpatch.fish", "share/doc/orvpatch/examples/orvpatch.logrotate",
+              *(f"share/man/{page}" for page in PAGES)}
 SITE = {"share/zsh/site-functions/_orvpatch", "share/doc/orvpatch/CHANGELOG.md", "share/doc/orvpatch/copyright"}
 DEBIAN = {"share/zsh/vendor-completions/_orvpatch", "share/doc/orvpatch/changelog.gz",
           "share/doc/orvpatch/changelog.Debian.gz", "share/doc/orvpatch/copyright",
@@ -89,7 +90,7 @@ def test_rpm_holds_exactly_what_is_shipped(rpm):
     files = {name for mode, *_, name in entries if not mode.startswith("d")}
     assert files == {f"/usr/{name}" for name in EVERYWHERE | SITE | documents()}
     assert {name for mode, *_, name in entries if mode.startswith("d")} == {
-        "/usr/share/doc/orvpatch", "/usr/share/doc/orvpatch/docs"}
+        "/usr/share/doc/orvpatch", "/usr/share/doc/orvpatch/docs", "/usr/share/doc/orvpatch/examples"}
     assert {(user, group, time) for _, user, group, time, _ in entries} == {("root", "root", str(EPOCH))}
     for mode, *_, name in entries:
         executable = mode.startswith("d") or name == "/usr/sbin/orvpatch"
@@ -99,6 +100,7 @@ def test_rpm_holds_exactly_what_is_shipped(rpm):
 def test_deb_control(build):
     fields = output_of("dpkg-deb", "-f", build.package(".deb")).decode()
     assert re.search(r"^Architecture: (.*)$", fields, re.M)[1] == build.architecture.deb
+    assert re.search(r"^Version: (.*)$", fields, re.M)[1] == f"{VERSION}-1"
     assert re.search(r"^Depends: (.*)$", fields, re.M)[1] == f"libc6 (>= {build.architecture.level}), procps"
 
 
@@ -110,7 +112,14 @@ def test_rpm_requirements(rpm):
     assert required - by_loader == {"(procps-ng or procps)", "tar", "grep", "util-linux"}
     levels = {level for name in by_loader for level in re.findall(r"GLIBC_([\d.]+)", name)}
     assert levels == {PPC64LE.level}
-    assert output_of("rpm", "-qp", "--qf", "%{ARCH} %{BUILDHOST}", rpm) == b"ppc64le localhost"
+    fields = output_of("rpm", "-qp", "--qf", "%{ARCH} %{BUILDHOST} %{VERSION}", rpm).decode()
+    assert fields == f"ppc64le localhost {VERSION}"
+
+
+@for_power
+def test_rpm_goes_below_usr_only(rpm):
+    """Pages and completions name their paths."""
+    assert output_of("rpm", "-qp", "--qf", "[%{PREFIXES}]", rpm) in (b"", b"(none)")
 
 
 def test_lintian_is_silent(build):

@@ -72,5 +72,21 @@ def test_library_calls_are_fortified(elf):
     assert {"__vsnprintf_chk", "__printf_chk", "__fprintf_chk"} <= undefined_symbols(elf)
 
 
+def test_debug_symbols_fit_the_shipped_program(build, tmp_path):
+    """They lie where debuggers look for them, by the build id of the stripped program, and tell where main begins."""
+    for archive in (build.symbols, build.package(".tar.gz")):
+        subprocess.run(["tar", "-C", tmp_path, "--strip-components=1", "-xzf", archive], check=True)
+    shipped = output_of("readelf", "-W", "-n", "-S", tmp_path / "sbin/orvpatch")
+    assert ".symtab" not in shipped and ".debug_info" not in shipped
+    build_id = re.search(r"Build ID: (\w+)", shipped)[1]
+    symbols = tmp_path / f"lib/debug/.build-id/{build_id[:2]}/{build_id[2:]}.debug"
+    address = re.search(r"^ *\d+: (\w+) .* main$", output_of("readelf", "-W", "-s", symbols), re.M)[1]
+    assert re.search(r"\bsrc/main\.cpp:\d+", output_of("addr2line", "-e", symbols, address))
+
+
+def output_of(*command):
+    return subprocess.run(command, check=True, capture_output=True, text=True).stdout
+
+
 def test_carries_no_search_path(elf):
     assert "(RPATH)" not in elf and "(RUNPATH)" not in elf

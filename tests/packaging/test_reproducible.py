@@ -5,6 +5,8 @@ import subprocess
 
 import pytest
 
+from shipped import VERSION
+
 pytestmark = pytest.mark.packages
 
 
@@ -19,9 +21,8 @@ def test_two_builds_are_the_same(build, other_build):
 
 
 def test_every_package_is_made(build):
-    version = build.package(".deb").name.split("_")[1].split("-")[0]
     made = sorted(path.name for path in build.packages.iterdir() if path.suffix in (".deb", ".rpm", ".gz"))
-    assert made == sorted(name.format(v=version) for name in build.architecture.packages)
+    assert made == sorted(name.format(v=VERSION) for name in build.architecture.packages)
 
 
 def test_nothing_warns(build, other_build):
