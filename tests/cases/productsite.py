@@ -6,7 +6,6 @@ import subprocess
 import time
 
 from support import Patch, Result
-
 from support.catalogue import text
 
 USAGE = (

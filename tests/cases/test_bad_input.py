@@ -5,8 +5,8 @@ import os
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
+
 from productsite import SUCCESS
 
 LIMIT = 1023  # no text of the catalogue is longer once it is filled

@@ -6,8 +6,8 @@ import signal
 import pytest
 
 from support import Patch, ProductHome, remove_tree, stubs
-
 from support.catalogue import text
+
 from productsite import Running, Site
 
 

@@ -3,8 +3,8 @@
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
+
 from productsite import SUCCESS, bad_home, usage
 
 VALID = Patch("ox").descriptor_text()

@@ -5,7 +5,6 @@ import os
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
 
 HOST = os.uname().nodename.split(".")[0]

@@ -5,7 +5,6 @@ import os
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
 
 KINDS = [("zt", "vecm"), ("qa", "vems"), ("pt", "veps"), ("dk", "vepd"), ("ox", "vema")]  # in order of application

@@ -13,7 +13,6 @@ from typing import NamedTuple
 import pytest
 
 from support import Patch, stubs
-
 from support.catalogue import text
 
 OX, UL, YN, QA = "Linux OS", "UNIX Logs", "Yellow Net", "Monitoring Server"

@@ -7,7 +7,6 @@ import re
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
 
 HISTORY_HEADER = (

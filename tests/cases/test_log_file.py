@@ -8,8 +8,8 @@ from concurrent.futures import ThreadPoolExecutor
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
+
 from golden import golden, words_of
 from productsite import SUCCESS
 from test_log_lines import DESCRIPTOR

@@ -6,7 +6,6 @@ import pwd
 import pytest
 
 from support import Patch, stubs
-
 from support.catalogue import text
 
 

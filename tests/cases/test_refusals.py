@@ -6,7 +6,6 @@ A row is what is installed, what is given, and the problem; an install and a rep
 import pytest
 
 from support import Patch, stubs
-
 from support.catalogue import text
 
 LOADED = ["+ tmp/kox", "+ tmp/kox/patch.ini"]  # the descriptor stays in the temporary directory

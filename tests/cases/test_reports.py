@@ -3,7 +3,6 @@
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
 
 OX, YN = "Monitoring Agent for Linux OS", "Yellow Net Agent"

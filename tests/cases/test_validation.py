@@ -3,7 +3,6 @@
 import pytest
 
 from support import Patch
-
 from support.catalogue import text
 
 INFO = ("[ProductInfo]\nproductCode = kox\npatchName = N\npatchDescriptiveName = T\nproductVer = 06\n"
