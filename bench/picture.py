@@ -24,9 +24,11 @@ ROW_STEP, FIRST_ROW = 84, 52
 BAR_LEFT, BAR_HEIGHT, BAR_STEP = 216, 18, 28
 
 STYLE = """
-  svg { --page: #ffffff; --text: #1f2328; --muted: #59636e; --line: #8b949e; --box: #f3f5f7; --own: #0f62ab; --other: #818b96 }
+  svg { --page: #ffffff; --text: #1f2328; --muted: #59636e; --line: #8b949e;
+        --box: #f3f5f7; --own: #0f62ab; --other: #818b96 }
   @media (prefers-color-scheme: dark) {
-    svg { --page: #0d1117; --text: #e6edf3; --muted: #9da7b1; --line: #6e7681; --box: #1b222b; --own: #58a6ff; --other: #7d8590 }
+    svg { --page: #0d1117; --text: #e6edf3; --muted: #9da7b1; --line: #6e7681;
+          --box: #1b222b; --own: #58a6ff; --other: #7d8590 }
   }
   .page { fill: var(--page) }
   text { font: 13px system-ui, sans-serif; fill: var(--text) }
@@ -66,12 +68,14 @@ def box(column, row, words):
         parts.append(f'<path d="M{x - BOX_STEP + BOX_WIDTH} {y + BOX_HEIGHT // 2} H{x - 2}" class="way"/>')
     elif row:
         last, middle = EDGE + (len(ROAD[0]) - 1) * BOX_STEP + BOX_WIDTH // 2, y - (ROW_STEP - BOX_HEIGHT) // 2
-        parts.append(f'<path d="M{last} {y - ROW_STEP + BOX_HEIGHT} V{middle} H{x + BOX_WIDTH // 2} V{y - 2}" class="way"/>')
+        down = f"M{last} {y - ROW_STEP + BOX_HEIGHT} V{middle} H{x + BOX_WIDTH // 2} V{y - 2}"
+        parts.append(f'<path d="{down}" class="way"/>')
     return parts
 
 
 def road():
-    boxes = [part for row, steps in enumerate(ROAD) for column, words in enumerate(steps) for part in box(column, row, words)]
+    places = [(column, row, words) for row, steps in enumerate(ROAD) for column, words in enumerate(steps)]
+    boxes = [part for place in places for part in box(*place)]
     below = FIRST_ROW + len(ROAD) * ROW_STEP - 10
     return [text(EDGE, 32, "The road of an install", "title"), *boxes,
             text(EDGE, below, "Once unpacking has begun, the first step that fails leads straight to the last box. "
@@ -109,7 +113,8 @@ def picture():
 def main(options):
     path = DOCS / "picture.svg"
     if options == ["--check"]:
-        return "docs/picture.svg is not that of the figures: run bench/picture.py" if path.read_text() != picture() else 0
+        same = path.read_text() == picture()
+        return 0 if same else "docs/picture.svg is not that of the figures: run bench/picture.py"
     if options:
         return __doc__
     path.write_text(picture())

@@ -25,6 +25,6 @@ def test_every_contender_is_shown_with_its_seconds():
 
 def test_each_colour_is_given_for_light_and_for_dark():
     style = next(element.text for element in ElementTree.parse(PICTURE).iter() if element.tag.endswith("}style"))
-    light, dark = re.findall(r"svg \{ (.*?) \}", style)
-    assert [pair.split(":")[0] for pair in light.split(";")] == [pair.split(":")[0] for pair in dark.split(";")]
-    assert set(re.findall(r"var\((--\w+)\)", style)) == {pair.split(":")[0].strip() for pair in light.split(";")}
+    light, dark = (re.findall(r"(--\w+):", scheme) for scheme in re.findall(r"svg \{ (.*?) \}", style, re.S))
+    assert light == dark
+    assert set(re.findall(r"var\((--\w+)\)", style)) == set(light)
