@@ -1,5 +1,16 @@
 # How everything here is compiled and linked.
 
+# ccache, where it is installed: what is shipped is compiled under the paths of its own checkout, everything else
+# is found again from other checkouts too.
+find_program(ORVPATCH_CCACHE ccache)
+if(ORVPATCH_CCACHE AND NOT DEFINED CMAKE_CXX_COMPILER_LAUNCHER)
+  set(CMAKE_CXX_COMPILER_LAUNCHER env CCACHE_SLOPPINESS=pch_defines,time_macros)
+  if(NOT ORVPATCH_HARDENED)
+    list(APPEND CMAKE_CXX_COMPILER_LAUNCHER CCACHE_BASEDIR=${CMAKE_SOURCE_DIR} CCACHE_NOHASHDIR=1)
+  endif()
+  list(APPEND CMAKE_CXX_COMPILER_LAUNCHER ${ORVPATCH_CCACHE})
+endif()
+
 add_library(orvpatch_options INTERFACE)
 target_compile_options(orvpatch_options INTERFACE -Wall -Wextra -Wpedantic -Wconversion -Wshadow)
 if(ORVPATCH_WERROR)

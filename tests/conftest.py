@@ -10,7 +10,15 @@ from support import ProductHome, Program, remove_tree, scratch_folder, second_ac
 os.umask(0o022)  # expected modes are written for it, and other users must get into the homes
 
 
-def pytest_collection_modifyitems(items):
+def pytest_addoption(parser):
+    parser.addoption("--part", default="1/1", metavar="I/N", help="run the I-th of N parts of the tests")
+
+
+@pytest.hookimpl(tryfirst=True)  # before they are shuffled: all parts together are the whole
+def pytest_collection_modifyitems(config, items):
+    part, parts = map(int, config.getoption("part").split("/"))
+    config.hook.pytest_deselected(items=[item for index, item in enumerate(items) if index % parts != part - 1])
+    items[:] = items[part - 1::parts]
     if os.geteuid() == 0:
         return
     for item in items:

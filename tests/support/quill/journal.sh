@@ -1,5 +1,7 @@
 # Sourced by the sample product's control scripts and by the scripts of sample patches. The caller sets
 # quill_home, the home without a trailing "/".
+#
+# shellcheck shell=sh disable=SC2154
 
 # An account in a private view of /etc/passwd has no name here.
 user_name() { id -un 2>/dev/null || true; }

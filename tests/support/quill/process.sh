@@ -1,5 +1,7 @@
 # Sourced by QuillAgent and QuillServer: starts and stops the process of one instance and keeps the run
 # information up to date. The caller sets quill_home, the home without a trailing "/".
+#
+# shellcheck shell=sh disable=SC2154
 
 run_info="$quill_home/config/.ConfigData/RunInfo"
 
