@@ -17,8 +17,10 @@ def pytest_addoption(parser):
 @pytest.hookimpl(tryfirst=True)  # before they are shuffled: all parts together are the whole
 def pytest_collection_modifyitems(config, items):
     part, parts = map(int, config.getoption("part").split("/"))
-    config.hook.pytest_deselected(items=[item for index, item in enumerate(items) if index % parts != part - 1])
-    items[:] = items[part - 1::parts]
+    config.hook.pytest_deselected(
+        items=[item for index, item in enumerate(items) if index % parts != part - 1]
+    )
+    items[:] = items[part - 1 :: parts]
     if os.geteuid() == 0:
         return
     for item in items:
@@ -31,7 +33,9 @@ def program():
     """The program under test; says what to do when it has not been built."""
     found = Program()
     if not found.binary.exists():
-        pytest.exit(f"{found.binary} is missing: cmake --preset dev && cmake --build --preset dev", returncode=2)
+        pytest.exit(
+            f"{found.binary} is missing: cmake --preset dev && cmake --build --preset dev", returncode=2
+        )
     return found
 
 

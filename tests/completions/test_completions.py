@@ -50,7 +50,17 @@ def folder(tmp_path_factory):
 
 
 def ask(words, folder):
-    done = subprocess.run(words, cwd=folder, env={**os.environ, "HOME": str(folder)}, stdin=subprocess.DEVNULL, capture_output=True, text=True, timeout=30)
+    # fish makes folders of its own, which would be offered: not in the home.
+    settings = {name: str(folder.parent / "settings") for name in ("XDG_CONFIG_HOME", "XDG_DATA_HOME")}
+    done = subprocess.run(
+        words,
+        cwd=folder,
+        env={**os.environ, "HOME": str(folder), **settings},
+        stdin=subprocess.DEVNULL,
+        capture_output=True,
+        text=True,
+        timeout=30,
+    )
     assert done.stderr == ""
     return done.stdout.splitlines()
 

@@ -1,6 +1,5 @@
 """Conversions of printf in every value that reaches a message: none of them is ever taken for one."""
 
-import os
 
 import pytest
 

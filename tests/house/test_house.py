@@ -57,9 +57,28 @@ def test_includes_point_downwards(path):
 @pytest.mark.parametrize("header", HEADERS, ids=relative)
 def test_a_header_compiles_alone(header):
     compiled = subprocess.run(
-        ["g++", "-std=c++17", "-Wall", "-Wextra", "-Wpedantic", "-Wconversion", "-Wshadow", "-Werror",
-         "-fsyntax-only", "-I", ROOT / "src", "-include", header, "-x", "c++", "/dev/null"],
-        capture_output=True, text=True, check=False)
+        [
+            "g++",
+            "-std=c++17",
+            "-Wall",
+            "-Wextra",
+            "-Wpedantic",
+            "-Wconversion",
+            "-Wshadow",
+            "-Werror",
+            "-fsyntax-only",
+            "-I",
+            ROOT / "src",
+            "-include",
+            header,
+            "-x",
+            "c++",
+            "/dev/null",
+        ],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
     assert compiled.returncode == 0, compiled.stderr
 
 
@@ -81,14 +100,22 @@ def test_sources_log_through_the_macros_only(path):
 
 
 def slugs_in(paths):
-    return {slug for path in paths for slug in re.findall(r"KEEP\(([a-z0-9-]+)\)", path.read_text(errors="replace"))}
+    return {
+        slug
+        for path in paths
+        for slug in re.findall(r"KEEP\(([a-z0-9-]+)\)", path.read_text(errors="replace"))
+    }
 
 
 def test_every_oddity_is_documented_and_held_by_a_test():
     in_code = slugs_in(SOURCES)
     in_document = slugs_in([ROOT / "docs/decisions.md"])
-    tests = [path for suffix in ("cpp", "py") for path in ROOT.glob(f"tests/**/*.{suffix}")
-             if path != Path(__file__).resolve()]
+    tests = [
+        path
+        for suffix in ("cpp", "py")
+        for path in ROOT.glob(f"tests/**/*.{suffix}")
+        if path != Path(__file__).resolve()
+    ]
     in_tests = slugs_in(tests)
     assert in_code, "no oddity found: the pattern is broken"
     assert in_document == in_code, "docs/decisions.md and the sources name different oddities"

@@ -13,7 +13,7 @@ class Report(NamedTuple):
     """What valgrind says of one process at its end."""
 
     errors: int
-    lost: int          # bytes
+    lost: int  # bytes
     descriptors: list  # those open at the end beside 0, 1, 2
     text: str
 
@@ -25,15 +25,25 @@ class Memcheck:
     def __init__(self, folder):
         self._folder = Path(folder)
         self.words = [
-            "valgrind", "--track-fds=yes", "--leak-check=full", f"--show-leak-kinds={_LOSSES}",
-            f"--errors-for-leak-kinds={_LOSSES}", f"--error-exitcode={ERROR_STATUS}", "--trace-children=no",
-            f"--suppressions={_SUPPRESSIONS}", f"--log-file={self._folder}/memcheck.%p"]
+            "valgrind",
+            "--track-fds=yes",
+            "--leak-check=full",
+            f"--show-leak-kinds={_LOSSES}",
+            f"--errors-for-leak-kinds={_LOSSES}",
+            f"--error-exitcode={ERROR_STATUS}",
+            "--trace-children=no",
+            f"--suppressions={_SUPPRESSIONS}",
+            f"--log-file={self._folder}/memcheck.%p",
+        ]
 
     def report(self):
         reports = self._reports()
-        main, = [text for text in reports.values() if _number(r"Parent PID: (\d+)", text) not in reports]
+        (main,) = [text for text in reports.values() if _number(r"Parent PID: (\d+)", text) not in reports]
         assert "ERROR SUMMARY" in main, main
-        lost = sum(_number(rf"{kind} lost: ([\d,]+) bytes", main) or 0 for kind in ("definitely", "indirectly", "possibly"))
+        lost = sum(
+            _number(rf"{kind} lost: ([\d,]+) bytes", main) or 0
+            for kind in ("definitely", "indirectly", "possibly")
+        )
         return Report(_number(r"ERROR SUMMARY: ([\d,]+)", main), lost, self._descriptors(main), main)
 
     def child_errors(self):
@@ -42,7 +52,9 @@ class Memcheck:
     def _descriptors(self, text):
         # Valgrind's own log is one of them; what a caller left open is none of the program's.
         opened = re.findall(r"Open (?:file descriptor|\S+ socket) (\d+): ?(.*)\n==\d+==    (.*)", text)
-        return [f"{number} {path} {where}" for number, path, where in opened if where != "<inherited from parent>"]
+        return [
+            f"{number} {path} {where}" for number, path, where in opened if where != "<inherited from parent>"
+        ]
 
     def _reports(self):
         files = self._folder.glob("memcheck.*")

@@ -20,6 +20,7 @@ ps --ppid $PPID -o stat= >>"$QUILLHOME/children\""""
 @pytest.fixture
 def run(program, scratch):
     """Runs the program under valgrind and asserts that there is nothing to find."""
+
     def checked(*arguments, status, **options):
         memcheck = Memcheck(scratch)
         result = program.run(*arguments, wrapper=memcheck.words, timeout=300, **options)
@@ -28,6 +29,7 @@ def run(program, scratch):
         assert memcheck.child_errors() == 0
         assert result.status == status, result
         return result
+
     return checked
 
 
@@ -45,9 +47,18 @@ def product(home):
 
 
 def whole_patch():
-    return (Patch("yn", level="06100200", prereqs={"ox": "061000"}, dependents=["ox", "qa", "wn"], exe="agent.exe")
-            .file("bin/agent").file("new/sub/file").file("bin/QuillHelp", "x").directory("empty")
-            .script("1.sh", "pre_patch", out="said").script("2.sh", "pre", err="cried").script("3.sh", "post"))
+    return (
+        Patch(
+            "yn", level="06100200", prereqs={"ox": "061000"}, dependents=["ox", "qa", "wn"], exe="agent.exe"
+        )
+        .file("bin/agent")
+        .file("new/sub/file")
+        .file("bin/QuillHelp", "x")
+        .directory("empty")
+        .script("1.sh", "pre_patch", out="said")
+        .script("2.sh", "pre", err="cried")
+        .script("3.sh", "post")
+    )
 
 
 def test_usage(run):
@@ -63,8 +74,11 @@ def test_validation(run, product, scratch):
     run("-h", product, "-vi", good, status=0)
 
 
-@pytest.mark.parametrize("text, status", [("", 6), ("x=1\n[ProductInfo]\nproductCode=ox\n", 7), (None, 5)],
-                         ids=["no section", "no key", "no file"])
+@pytest.mark.parametrize(
+    "text, status",
+    [("", 6), ("x=1\n[ProductInfo]\nproductCode=ox\n", 7), (None, 5)],
+    ids=["no section", "no key", "no file"],
+)
 def test_a_validation_that_fails(run, product, scratch, text, status):
     if text is not None:
         (scratch / "bad.ini").write_text(text)

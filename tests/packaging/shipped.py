@@ -128,4 +128,3 @@ def _copy_sources(target):
         if not (target / path).exists() or (target / path).read_bytes() != content:
             (target / path).parent.mkdir(parents=True, exist_ok=True)
             shutil.copy(CHECKOUT / path, target / path)
-

@@ -89,9 +89,17 @@ def outcome(program, arrange, folder, environment):
         def take(path):
             return mask(home.read(path)) if tree.pop(path, None) else None
 
-        found = Outcome(done.status, mask(done.out), mask(done.err), take("patchlogs/orvpatch.log"),
-                        take("patchlogs/patches.hist"), take("config/.ConfigData/RunInfo"), home.instances(),
-                        home.journal(), tree)
+        found = Outcome(
+            done.status,
+            mask(done.out),
+            mask(done.err),
+            take("patchlogs/orvpatch.log"),
+            take("patchlogs/patches.hist"),
+            take("config/.ConfigData/RunInfo"),
+            home.instances(),
+            home.journal(),
+            tree,
+        )
     for entry in folder.iterdir():
         remove_tree(entry)
     return found

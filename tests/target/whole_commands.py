@@ -15,6 +15,7 @@ def command(status):
     def enter(arrange):
         COMMANDS[arrange.__name__] = (status, arrange)
         return arrange
+
     return enter
 
 
@@ -35,6 +36,7 @@ def act(action, home, path):
 
 
 # --- command lines and paths ---------------------------------------------------------------------------------
+
 
 @command(1)
 def usage(home, patches):
@@ -74,6 +76,7 @@ def report_of_a_device(home, patches):
 
 # --- descriptors ---------------------------------------------------------------------------------------------
 
+
 @command(0)
 def valid_descriptor(home, patches):
     return act("-vi", home, patch(prereqs={"AX": "061000"}).write_descriptor(patches / "patch.ini"))
@@ -86,7 +89,9 @@ def no_descriptor(home, patches):
 
 @command(6)
 def descriptor_without_product(home, patches):
-    return act("-vi", home, patch(descriptor="[PreReqs]\nax = 061000\n").write_descriptor(patches / "patch.ini"))
+    return act(
+        "-vi", home, patch(descriptor="[PreReqs]\nax = 061000\n").write_descriptor(patches / "patch.ini")
+    )
 
 
 @command(7)
@@ -96,6 +101,7 @@ def descriptor_without_name(home, patches):
 
 
 # --- refusals ------------------------------------------------------------------------------------------------
+
 
 @command(3)
 def dotted_members(home, patches):
@@ -152,11 +158,14 @@ def console_runs(home, patches):
 
 # --- reports -------------------------------------------------------------------------------------------------
 
+
 @command(0)
 def report_of_two_patches(home, patches):
     product(home, "prod", "")
     home.component("qa")
-    patch(dependents=["all"]).script("2.sh", "pre").script("10.sh", "pre").script("1.sh", "pre_patch").write(patches)
+    patch(dependents=["all"]).script("2.sh", "pre").script("10.sh", "pre").script("1.sh", "pre_patch").write(
+        patches
+    )
     Patch("qa", target="vems").file("bin/server").script("1.sh", "post").write(patches)
     return act("-t", home, patches)
 
@@ -176,6 +185,7 @@ def report_over_a_planted_link(home, patches):
 
 
 # --- installs ------------------------------------------------------------------------------------------------
+
 
 @command(0)
 def install(home, patches):
@@ -320,7 +330,11 @@ def folder_cannot_be_made(home, patches):
 @command(28)
 def version_file_is_gone(home, patches):
     product(home)
-    return act("-i", home, patch().script("1.sh", "post", body='rm "$quill_home/registry/xelpp266.ver"').write(patches))
+    return act(
+        "-i",
+        home,
+        patch().script("1.sh", "post", body='rm "$quill_home/registry/xelpp266.ver"').write(patches),
+    )
 
 
 # --- the environment -----------------------------------------------------------------------------------------
