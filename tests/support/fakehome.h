@@ -1,5 +1,6 @@
 // A scratch home with a product in it: version files, run information, a `ps` that answers what the test has
-// written down, and the sample product's control scripts, which journal their arguments and answer as ordered.
+// written down, and the sample product's control scripts, which journal their arguments and answer as
+// ordered.
 #pragma once
 
 #include <functional>
