@@ -88,6 +88,7 @@ endforeach()
 # A file is a test; several where it takes long, by the words given here.
 set(more_faults.system_calls PARTS 4 COST 100)
 set(more_faults.kills PARTS 4 COST 100)
+set(more_faults.combinations PARTS 4 COST 60)
 set(more_faults.conditions COST 50)
 set(more_memory.memory_units PARTS 5 COST 100)
 set(more_memory.memory_commands PARTS 4 COST 60)
