@@ -24,7 +24,9 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   return application;
 }
 
-int runApplication(int argc, const char *const *argv) {
+namespace {
+
+int parseAndRun(int argc, const char *const *argv) {
   Invocation invocation;
   const std::unique_ptr<CLI::App> application = makeApplication(invocation);
   // What is read with the installer's units must not be told in the log of any home.
@@ -41,4 +43,15 @@ int runApplication(int argc, const char *const *argv) {
     return CannotJudge;
   }
   return invocation.status;
+}
+
+} // namespace
+
+int runApplication(int argc, const char *const *argv) {
+  const int status = parseAndRun(argc, argv);
+  // A document that a full disk has cut off must not pass for a whole one.
+  if (fflush(stdout) == 0 && ferror(stdout) == 0)
+    return status;
+  fputs("orvpatchctl: cannot write to standard output\n", stderr);
+  return CannotJudge;
 }
