@@ -33,6 +33,7 @@ set(wrapped_calls
   rmdir
   stat
   syncfs
+  time
   uname
   unlink
   wait

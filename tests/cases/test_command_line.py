@@ -68,6 +68,16 @@ def test_a_file_is_no_home(site):
     assert site.listed() == ["patch.ini"]
 
 
+@pytest.mark.parametrize("mode", [0o300, 0o111])
+def test_a_home_that_may_not_be_read_is_one_all_the_same(site, mode):
+    path = site.descriptor(VALID)
+    site.as_ordinary_user()
+    site.home.path.chmod(mode)
+    result = site.program.validate(site.home, path, user=site.user)
+    site.home.path.chmod(0o755)
+    assert result == site.done(f"\n{path} is valid\n\n")
+
+
 def test_a_bad_home_of_the_self_check_ends_with_status_2(site):
     assert site.run("-h", "/nonexistent", "-utest") == bad_home("/nonexistent/")
 

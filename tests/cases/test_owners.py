@@ -37,6 +37,15 @@ def test_root_starts_an_agent_as_its_owner(site, other_owner):
 
 
 @pytest.mark.needs_root
+def test_root_starts_an_agent_as_its_owner_each_time(site, other_owner):
+    site.home.start("yn", "north", user=other_owner.uid)
+    patches = [Patch("yn", fixpack="fp0001"), Patch("yn", fixpack="fp0002")]
+    assert site.install(*patches, wrapper=other_owner.wrapper) == site.done()
+    assert [(str(call), call.user) for call in site.home.journal()] == 2 * [
+        ("QuillAgent -o north stop yn", "root"), ("QuillAgent -o north start yn", other_owner.name)]
+
+
+@pytest.mark.needs_root
 def test_the_command_goes_through_su(site, other_owner):
     site.home.start("yn", "north", user=other_owner.uid)
     site.install(Patch("yn"), wrapper=other_owner.wrapper)
@@ -86,6 +95,20 @@ def test_others_cannot_start_an_agent_of_another_user(ordinary):
     assert log[begin + 1:begin + 3] == [
         ("ERROR", "orvcomponent", text("ERROR_START_CANT_SU", "root")),
         ("TRACE", "orvcomponent", "startInstance() exit")]
+
+
+@pytest.mark.needs_root
+def test_a_user_without_a_name_cannot_start_an_agent_of_another_user(site):
+    site.home.add_row("yn", FOREIGN)
+    site.home.fail("stop", "yn", status=0)
+    patch = site.target(Patch("yn").file("bin/tool"))
+    site.user = 3999999  # as many a container has its users
+    for path in [site.home.path, *site.home.path.rglob("*")]:
+        os.chown(path, site.user, site.user, follow_symlinks=False)
+    assert site.install(patch) == site.failed(20, text("ERROR_START_CANT_SU", "root"))
+    assert site.home.calls() == ["QuillAgent stop yn"]
+    assert [entry.user for entry in site.home.history()] == [""]
+    assert site.home.log().headers[0].user == ""
 
 
 def test_others_cannot_start_the_os_agent_of_another_user(ordinary):

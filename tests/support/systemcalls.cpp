@@ -29,6 +29,8 @@ struct State {
   std::size_t readableBytes = SIZE_MAX;
   bool answersUser = false;
   uid_t user = 0;
+  std::string userName;
+  time_t now = -1;
   std::string nodeName;
 };
 
@@ -83,6 +85,14 @@ void answerNodeName(const std::string &name) {
 void answerUser(uid_t user) {
   state().answersUser = true;
   state().user = user;
+}
+
+void answerUserName(const std::string &name) {
+  state().userName = name;
+}
+
+void answerTime(time_t now) {
+  state().now = now;
 }
 
 void restoreSystemCalls() {
@@ -142,6 +152,7 @@ int __real_putenv(char *variable);
 uid_t __real_getuid();
 passwd *__real_getpwuid(uid_t user);
 int __real_uname(utsname *host);
+time_t __real_time(time_t *now);
 tm *__real_localtime(const time_t *time);
 tm *__real_localtime_r(const time_t *time, tm *result);
 void *__real_malloc(size_t size);
@@ -300,7 +311,15 @@ uid_t __wrap_getuid() {
 }
 
 passwd *__wrap_getpwuid(uid_t user) {
-  return fails("getpwuid", std::to_string(user)) ? nullptr : __real_getpwuid(user);
+  if (fails("getpwuid", std::to_string(user)))
+    return nullptr;
+  if (state().userName.empty())
+    return __real_getpwuid(user);
+  static passwd entry;
+  entry = {};
+  entry.pw_name = state().userName.data();
+  entry.pw_uid = user;
+  return &entry;
 }
 
 int __wrap_uname(utsname *host) {
@@ -308,6 +327,13 @@ int __wrap_uname(utsname *host) {
   if (result == 0 && !state().nodeName.empty())
     std::snprintf(host->nodename, sizeof host->nodename, "%s", state().nodeName.c_str());
   return result;
+}
+
+time_t __wrap_time(time_t *now) {
+  const time_t answer = state().now == -1 ? __real_time(nullptr) : state().now;
+  if (now != nullptr)
+    *now = answer;
+  return answer;
 }
 
 tm *__wrap_localtime(const time_t *time) {

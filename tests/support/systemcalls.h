@@ -51,8 +51,10 @@ void failAllocationOf(std::size_t size);
 void limitTransfers(std::size_t bytes);
 /// Lets reads find the end of the file after so many bytes in all.
 void endReadsAfter(std::size_t bytes);
-/// Results of getuid and uname.
+/// Results of getuid, getpwuid, time and uname.
 void answerUser(uid_t user);
+void answerUserName(const std::string &name);
+void answerTime(time_t now);
 void answerNodeName(const std::string &name);
 /// Restores the system's behaviour of every call and forgets the recorded calls.
 void restoreSystemCalls();

@@ -6,6 +6,7 @@
 #include <vector>
 
 #include <dirent.h>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -233,6 +234,17 @@ class ListingTest : public ScratchHome {
 protected:
   File directory() const { return File(home() + "dir"); }
 };
+
+TEST_F(ListingTest, OnlyTheDirectoryItselfAndItsParentAreLeftOut) {
+  for (const char *name : {".a", "...", "..b", ". "})
+    write(std::string("dir/") + name, "");
+  makeDirectory("dir/.d");
+  File listed = directory();
+  EXPECT_THAT(pathsOf(listed.listFiles()),
+              ::testing::UnorderedElementsAre(home() + "dir/.a", home() + "dir/...", home() + "dir/..b",
+                                              home() + "dir/. "));
+  EXPECT_THAT(pathsOf(listed.listSubDirectories()), ::testing::ElementsAre(home() + "dir/.d/"));
+}
 
 TEST_F(ListingTest, FilesAndSubDirectoriesAreToldApart) {
   write("dir/file", "");

@@ -133,6 +133,11 @@ TEST_F(StartTest, PrimaryIsStartedByItsNameButReportedAsTheDefaultInstance) {
 }
 
 // KEEP(null-record-silent)
+TEST_F(StartTest, PrimaryIsTheDefaultInstanceInThisSpellingOnly) {
+  expectStartFailure("primary", "QuillAgent [-o] [primary] [start] [ox]",
+                     {13, "Unable to start instance primary of agent for product Sample."});
+}
+
 TEST_F(StartTest, FailureWithoutARecordLeavesNoErrorLine) {
   onCall("QuillAgent [start] [ox]", "exit 3");
   const auto kox = running("ox", {});
@@ -196,6 +201,14 @@ TEST_F(StartTest, OwnerCountsForEachInstanceAlone) {
   EXPECT_EQ(linesOf("process.cpp", logLines()),
             commandLines({"/bin/sh", "-c", agentScript() + " -o new start ox"}))
       << "an instance without an owner is the user's own";
+}
+
+TEST_F(StartTest, OwnerOfTheLastRowOfAnInstanceDecides) {
+  const auto kox = running("ox", {{"ox", "11", "abc", "first"}, {"ox", "12", "abc", "second"}});
+  const RealUserScope ordinaryUser;
+  PatchError err;
+  EXPECT_FALSE(kox->startInstance("abc", &err));
+  EXPECT_EQ(recordOf(err), Record(20, "Unable to su to user: second"));
 }
 
 TEST_F(StartTest, RootStartsTheInstanceOfAnotherAsItsOwner) {
@@ -294,6 +307,27 @@ TEST_F(StopTest, FailedScriptWhoseProcessHasGoneCountsAsSuccess) {
                                 own({"QuillAgent stop failed, but the Process ID is no longer active. "
                                      "Assuming agent is now not running",
                                      "stopInstance(abc) exit"})}));
+}
+
+TEST_F(StopTest, ProcessOfTheLastRowOfAnInstanceDecides) {
+  onCall("QuillAgent [-o] [abc] [stop] [ox]", "exit 3");
+  const std::vector<RunRow> rows = {{"ox", "4711", "abc"}, {"ox", "4712", "abc"}};
+  const auto firstHasGone = running("ox", rows);
+  endProcess("4711");
+  EXPECT_FALSE(firstHasGone->stopInstance("abc", nullptr));
+  const auto lastHasGone = running("ox", rows);
+  endProcess("4712");
+  EXPECT_TRUE(lastHasGone->stopInstance("abc", nullptr));
+}
+
+TEST_F(StopTest, ProcessIsStillTheOneOfTheStartOfTheRunAfterAStopAndAStart) {
+  const auto kox = running("ox", {{"ox", "4711", "abc"}});
+  EXPECT_TRUE(kox->stopInstance("abc", nullptr));
+  EXPECT_TRUE(kox->startInstance("abc", nullptr));
+  onCall("QuillAgent [-o] [abc] [stop] [ox]", "exit 3");
+  EXPECT_FALSE(kox->stopInstance("abc", nullptr));
+  endProcess("4711");
+  EXPECT_TRUE(kox->stopInstance("abc", nullptr));
 }
 
 TEST_F(StopTest, FailureOfTheDefaultInstanceIsCode14) {

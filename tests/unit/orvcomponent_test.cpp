@@ -54,8 +54,8 @@ TEST_P(ComponentNameTest, IsTheCodeInItsKForm) {
 INSTANTIATE_TEST_SUITE_P(Codes, ComponentNameTest,
                          ::testing::Values(CodeName{"ox", "kox"}, CodeName{"OX", "kox"},
                                            CodeName{"kox", "kox"}, CodeName{"KQA", "kqa"},
-                                           CodeName{"x.", "kx."}, CodeName{"x", "x"}, CodeName{"", ""},
-                                           CodeName{"ABCD", "abcd"}));
+                                           CodeName{"ka", "kka"}, CodeName{"x.", "kx."}, CodeName{"x", "x"},
+                                           CodeName{"", ""}, CodeName{"ABCD", "abcd"}));
 
 TEST_F(ComponentTest, HoldsWhatItWasMadeFrom) {
   const ORVComponent made(home(), "hv", "Hypervisor Agent", "06100003", "li6243", {"oxli6243", "none"},
@@ -147,6 +147,11 @@ TEST_F(ComponentTest, OtherKindsAreConstructedWithoutALineAboutTheRunInformation
                                                 "ORVComponent::ORVComponent() exit"}));
 }
 
+TEST_F(ComponentTest, ServerWhoseCodeWasGivenInCapitalsLooksAtTheRunInformationToo) {
+  const auto made = component("QA", row(Util::getHostName(), "qa", "hub"), ORVComponent::TYPE_VEMS);
+  EXPECT_EQ(made->getActiveInstances(), Names{"hub"});
+}
+
 TEST_F(ComponentTest, LineEndsAloneAreNoRunInformation) {
   EXPECT_EQ(instances("ox", "\n\n\n"), Names{});
   EXPECT_EQ(ownLines()[2], trace("orvcomponent", "no cinfo data"));
@@ -188,6 +193,9 @@ TEST_F(ComponentTest, SeparatorIsWhatTheFirstLineSays) {
   const std::string host = Util::getHostName();
   setProcess("4711");
   EXPECT_EQ(instances("ox", "FIELDSEP=;\n" + host + ";ox;4711;a|b;x\n"), Names{"a|b"});
+  EXPECT_EQ(instances("ox", "FIELDSEP=|;\n" + host + "|ox;4711|;abc;x\n"), Names{"abc"});
+  EXPECT_EQ(instances("ox", "FIELDSEP=|=x\n" + host + "|ox|4711|a=x|y\n"), Names{"a=x"})
+      << "it ends at a second equal sign";
   EXPECT_EQ(instances("ox", "anything=,\n" + host + ",ox,4711,abc,x"), Names{"abc"});
 }
 
@@ -309,9 +317,9 @@ TEST_F(IsRunningTest, OwnerIsTrimmed) {
 
 TEST_F(IsRunningTest, OnlyBlanksEndTheOwner) {
   setPsOfProcess("47", "  47 ?   00:00:00 agent\n");
-  setPsOfAll("EX+o~r,v_q-u.i|l=l$ 47 1\n");
+  setPsOfAll("EX+o~r,v_q-u.i|l=l$\tx 47 1\n");
   EXPECT_TRUE(isRunning("47", owner_));
-  EXPECT_EQ(owner_, "EX+o~r,v_q-u.i|l=l$");
+  EXPECT_EQ(owner_, "EX+o~r,v_q-u.i|l=l$\tx");
 }
 
 TEST_F(IsRunningTest, ProcessWithoutAnOwnerRunsAllTheSame) {

@@ -119,7 +119,7 @@ TEST_P(VersionFileNameTest, TellsProductArchitectureAndKind) {
   EXPECT_EQ(component->getArch(), expected.arch);
   EXPECT_EQ(component->getType(), expected.type);
   const bool isServer = dynamic_cast<const UNIXMonitoringServer *>(component) != nullptr;
-  EXPECT_EQ(isServer, std::string(expected.name) == "kqa");
+  EXPECT_EQ(isServer, std::string(expected.file).rfind("qa", 0) == 0);
 }
 
 INSTANTIATE_TEST_SUITE_P(
@@ -139,17 +139,24 @@ INSTANTIATE_TEST_SUITE_P(
                       VersionFileName{"dkvps.ver", "kdk", "vps", Kind::TYPE_VEPD},
                       VersionFileName{"oxvms.ver.vps.ver", "kox", "vms.ver.vps", Kind::TYPE_VEMS},
                       VersionFileName{"oxvpd.ver.vps.ver", "kox", "vpd.ver.vps", Kind::TYPE_VEPS},
+                      VersionFileName{"oxvps.verli.ver", "kox", "vps.verli", Kind::TYPE_VEPS},
+                      VersionFileName{"oxzt266.ver", "kox", "zt266", Kind::TYPE_AGENT},
+                      VersionFileName{"QAlpp266.ver", "kqa", "lpp266", Kind::TYPE_AGENT},
                       VersionFileName{"ox.1.ver", "kox", ".1", Kind::TYPE_AGENT},
                       VersionFileName{"ox.ver", "kox", "", Kind::TYPE_AGENT},
                       VersionFileName{"x.ver", "kx.", "", Kind::TYPE_AGENT},
                       VersionFileName{".ver", "k.v", "", Kind::TYPE_AGENT}));
 
 TEST_F(RegistryTest, KindIsLookedForInTheWholePath) {
-  const std::string path = write("vms.ver.d/oxlpp266.ver", "VRMF = 06100000\n");
-  ORVComponentRegistry *empty = registry();
-  empty->buildComponent(path, "");
-  ASSERT_EQ(empty->getInstalledComponents()->size(), 1U);
-  EXPECT_EQ(empty->getInstalledComponents()->front()->getType(), Kind::TYPE_VEMS);
+  const std::pair<const char *, Kind> kinds[] = {{"vms.ver.d", Kind::TYPE_VEMS},
+                                                 {"vps.ver.d", Kind::TYPE_VEPS},
+                                                 {"vpd.ver.d", Kind::TYPE_VEPD},
+                                                 {"zt", Kind::TYPE_AGENT}};
+  ORVComponentRegistry *built = registry();
+  for (const auto &[folder, kind] : kinds) {
+    built->buildComponent(write(std::string(folder) + "/oxlpp266.ver", "VRMF = 06100000\n"), "");
+    EXPECT_EQ(built->getInstalledComponents()->back()->getType(), kind) << folder;
+  }
 }
 
 class IgnoredFileTest : public RegistryTest, public ::testing::WithParamInterface<const char *> {};

@@ -328,6 +328,20 @@ TEST_F(DescriptorTest, ParsingAnIniFileFillsAnObject) {
   EXPECT_EQ(ownLines().front(), trace("patchdescriptor.cpp", Parsing));
 }
 
+TEST_F(DescriptorTest, ListsThatAreReadAgainAreReplaced) {
+  PatchDescriptor descriptor;
+  for (const char *name : {"first", "second"}) {
+    const Section section = sectionOf("Any", {{name}});
+    descriptor.buildDependentsSection(&section, nullptr);
+    descriptor.buildPrePatchCmdsSection(&section, nullptr);
+    descriptor.buildPreCmdsSection(&section, nullptr);
+    descriptor.buildPostCmdsSection(&section, nullptr);
+  }
+  for (const Names &list : {descriptor.getDependents(), descriptor.getPrePatchCommands(),
+                            descriptor.getPreCommands(), descriptor.getPostCommands()})
+    EXPECT_EQ(list, Names{"second"});
+}
+
 TEST_F(DescriptorTest, CopyHoldsEverythingAndOwnsItsLevel) {
   const std::string text = Minimal + "productBinArch = a b\nproductEXE = e\n[PreReqs]\nox = 061000\n"
                                      "[Dependents]\nox\n[PrePatchCommands]\n1\n[PreCommands]\n2\n"

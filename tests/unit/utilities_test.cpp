@@ -11,6 +11,7 @@
 #include <sys/utsname.h>
 #include <unistd.h>
 
+#include "logger.h"
 #include "scratch.h"
 
 namespace {
@@ -164,6 +165,22 @@ TEST_F(UtilitiesTest, EnvironmentIsSetAndSetAgain) {
   unsetenv(name.c_str());
 }
 
+TEST_F(UtilitiesTest, TextsOfTheEnvironmentStayWhereTheyAreWhenOthersFollow) {
+  // Short ones: such a string keeps its text in itself.
+  Util::setEnvironment("QUILL_A", "x");
+  const char *const first = getenv("QUILL_A");
+  for (int i = 0; i < 200; ++i)
+    Util::setEnvironment("QUILL_B", std::to_string(i));
+  EXPECT_EQ(getenv("QUILL_A"), first);
+  EXPECT_STREQ(first, "x");
+  EXPECT_STREQ(getenv("QUILL_B"), "199");
+  Util::setEnvironment("QUILL_A", "y");
+  EXPECT_STREQ(first, "x") << "who has asked before keeps the answer";
+  EXPECT_STREQ(getenv("QUILL_A"), "y");
+  unsetenv("QUILL_A");
+  unsetenv("QUILL_B");
+}
+
 TEST_F(UtilitiesTest, HostNameIsTheNodeNameUpToItsFirstDot) {
   utsname host{};
   ASSERT_EQ(uname(&host), 0);
@@ -174,6 +191,23 @@ TEST_F(UtilitiesTest, HostNameIsTheNodeNameUpToItsFirstDot) {
 TEST_F(UtilitiesTest, UserNameIsTheLoginNameOfTheRealUser) {
   const passwd *entry = getpwuid(getuid());
   EXPECT_EQ(Util::getUserName(), entry == nullptr ? "" : entry->pw_name);
+}
+
+TEST_F(UtilitiesTest, UserNameIsNotTakenFromTheEnvironment) {
+  const std::string name = Util::getUserName();
+  for (const char *variable : {"LOGNAME", "USER"}) {
+    const char *const value = getenv(variable);
+    const std::string before = value == nullptr ? "" : value;
+    setenv(variable, "of-the-environment", 1);
+    EXPECT_EQ(Util::getUserName(), name);
+    logInit();
+    EXPECT_NE(read(glbLogFileName).rfind("\n   User Name:   " + name + "\n"), std::string::npos);
+    EXPECT_EQ(read(glbLogFileName).find("of-the-environment"), std::string::npos);
+    if (value == nullptr)
+      unsetenv(variable);
+    else
+      setenv(variable, before.c_str(), 1);
+  }
 }
 
 TEST_F(UtilitiesTest, UserNameOfRootIsRoot) {
@@ -225,6 +259,15 @@ TEST_F(UtilitiesTest, CurrentDirectoryHasNoTrailingSlash) {
   makeDirectory("work");
   EXPECT_TRUE(Util::setCurrentDirectory(home() + "work/"));
   EXPECT_EQ(Util::getCurrentDirectory(), home() + "work");
+}
+
+TEST_F(UtilitiesTest, LongCurrentDirectoryIsToldWhole) {
+  std::string path = home();
+  for (int level = 0; level < 10; ++level)
+    path += std::string(200, 'd') + "/";
+  fs::create_directories(path);
+  ASSERT_TRUE(Util::setCurrentDirectory(path));
+  EXPECT_EQ(Util::getCurrentDirectory() + "/", path);
 }
 
 TEST_F(UtilitiesTest, CurrentDirectoryThatWasRemovedIsEmpty) {

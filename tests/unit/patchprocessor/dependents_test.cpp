@@ -108,9 +108,11 @@ TEST_P(AimTest, AgentAndFourthKindPatchesAndThoseOfTheTwoServersHaveDependents) 
 INSTANTIATE_TEST_SUITE_P(
     Targets, AimTest,
     ::testing::Values(Aim{"kxe_lpp266_vema_1.tar", "kxe", true}, Aim{"kzt_lpp266_vecm_1.tar", "kzt", true},
-                      Aim{"kox_lpp266_vems_1.tar", "kox", false}, Aim{"kxe_lpp266_veps_1.tar", "kxe", false},
-                      Aim{"kdk_lpp266_vepd_1.tar", "kdk", false}, Aim{"kqa_lpp266_vems_1.tar", "kqa", true},
-                      Aim{"kpt_lpp266_veps_1.tar", "kpt", true}, Aim{"kqa_lpp266_vepd_1.tar", "kpt", true}));
+                      Aim{"kxe_lpp266_vecm_1.tar", "kxe", true}, Aim{"kox_lpp266_vems_1.tar", "kox", false},
+                      Aim{"kxe_lpp266_veps_1.tar", "kxe", false}, Aim{"kdk_lpp266_vepd_1.tar", "kdk", false},
+                      Aim{"kqa_lpp266_vems_1.tar", "kqa", true}, Aim{"kpt_lpp266_veps_1.tar", "kpt", true},
+                      Aim{"kqa_lpp266_vepd_1.tar", "kpt", true}, Aim{"kqa_lpp266_vems_1.tar", "kox", false},
+                      Aim{"kox_lpp266_vems_1.tar", "kqa", true}));
 
 TEST_F(DependentsTest, PatchWithoutDependentsStopsNothingThatRuns) {
   installAgents({"ox"});
@@ -291,6 +293,18 @@ TEST_F(DependentsTest, LaterComponentOfTheSameNameReplacesTheEntryOfAll) {
   EXPECT_EQ(printed(withDependents({"all"})), Heading + "    one instance of kyn\n\n");
 }
 
+TEST_F(DependentsTest, LaterComponentOfTheSameNameReplacesWhatAllHasStopped) {
+  install("ynlpp266.ver", "06200000", "kyn");
+  install("ynli6243.ver", "06200000", "kyn");
+  setRunning({{"yn", "11", "one"}});
+  const Processor kxe = withDependents({"all"});
+  stopLines(kxe);
+  const std::string call = "QuillAgent [-o] [one] [stop] [yn]";
+  EXPECT_EQ(calls(), (Names{call, call})) << "each has its own list of active instances";
+  startLines(kxe);
+  EXPECT_EQ(calls(), Names{"QuillAgent [-o] [one] [start] [yn]"});
+}
+
 TEST_F(DependentsTest, StoppedInstancesAreStartedInTheOrderOfTheCodes) {
   installAgents({"yn", "hv", "aa"});
   setRunning({{"yn", "11", "b"}, {"yn", "12", "a"}, {"hv", "13"}, {"aa", "14"}});
@@ -317,6 +331,8 @@ TEST_F(DependentsTest, ServerPatchStopsItsDependentsAndTheServerItself) {
   install("qalpp266.ver", "06200000", "Server");
   setRunning({{"qa", "11", "hub"}, {"ox", "12", "named"}});
   const Processor kqa = withDependents({"ox"}, "kqa_lpp266_vems_1.tar", "kqa");
+  EXPECT_EQ(printed(withDependents({"ox"}, "kqa_lpp266_vems_1.tar", "kqa")),
+            Heading + "    named instance of kox\n    hub instance of Server\n\n");
   stopLines(kqa);
   EXPECT_EQ(calls(), (Names{"QuillAgent [-o] [named] [stop] [ox]", "QuillServer [stop] [hub]"}));
   EXPECT_EQ(startLines(kqa), pps({StartEntry, "Attempting to start instance [hub]", StartDone}));

@@ -189,6 +189,24 @@ TEST_F(LifecycleTest, DescriptorIsReadFromTheTemporaryDirectory) {
   EXPECT_EQ(kxe->getDescriptor()->getPatchName(), "kxe fix pack");
 }
 
+TEST_F(LifecycleTest, DescriptorThatIsReadAgainReplacesTheOneOfBefore) {
+  const Processor kxe = loaded(PatchName, patchIni("kxe"));
+  write("tmp/kxe/patch.ini", patchIni("kyn"));
+  EXPECT_TRUE(kxe->parsePatchDescriptor(nullptr));
+  EXPECT_EQ(kxe->getDescriptor()->getProductCode(), "kyn");
+  write("tmp/kxe/patch.ini", "");
+  EXPECT_FALSE(kxe->parsePatchDescriptor(nullptr));
+  EXPECT_EQ(kxe->getDescriptor(), nullptr);
+}
+
+TEST_F(LifecycleTest, TemporaryDirectoryIsThatOfTheFileNameAlsoWhenTheDescriptorIsOfAnother) {
+  const Processor kxe = loaded(PatchName, patchIni("kyn"));
+  write("tmp/kyn/mine", "");
+  EXPECT_TRUE(kxe->cleanUp(nullptr));
+  EXPECT_FALSE(isThere(home() + "tmp/kxe"));
+  EXPECT_TRUE(isThere(home() + "tmp/kyn/mine"));
+}
+
 TEST_F(LifecycleTest, TemporaryDirectoryThatEndsInASlashGetsNoSecondOne) {
   const std::string path = write("tmp/patch.ini", patchIni("kxe"));
   const Processor nameless = processorFor("readme.tar"); // no product in the name: home + "tmp/"

@@ -173,6 +173,21 @@ TEST_F(PrereqTest, PrerequisitesAreTakenInTheOrderOfTheirCodesAndTraced) {
                                      "Prereq previously verified.", "PatchProcessor::checkPrereqs() = 1"})}));
 }
 
+TEST_F(PrereqTest, LevelIsThatOfTheComponentOfThePatchsPlatform) {
+  for (const char *other : {"xeaix526.ver", "xelpp263.ver", "xelpp269.ver", "xeunix.ver"})
+    install(other, "07000000");
+  expectMet(atLevels("06200000", "06200001"));
+}
+
+TEST_F(PrereqTest, OwnProductIsThatOfTheDescriptorNotOfTheFileName) {
+  install("xelpp266.ver", "06200000");
+  const auto patch = [&](const std::string &prereq) {
+    return loaded("kyn_lpp266_vema_fp0001.tar", patchIni("kxe", "06200001", prereqSection({prereq})));
+  };
+  expectMet(patch("kxe = 09999999"));
+  expectRefused(patch("kyn = 061000"), {9, "Missing patch prerequisite: kyn 06.10.00.00"});
+}
+
 TEST_F(PrereqTest, MissingPrerequisiteIsCode9AndNamesItsDottedLevel) {
   const Processor kxe = withPrereqs({"kox = 061000", "kyn = 061000"});
   const std::string message = "Missing patch prerequisite: kox 06.10.00.00";
@@ -365,6 +380,17 @@ TEST_F(ActiveTest, ServerThatIsNotInstalledPasses) {
 TEST_F(ActiveTest, ConsoleOfAnotherHomePasses) {
   setPsOfAll("quill 11 1 0 08:00 ? java -jar /elsewhere/classes/wbt.jar\n");
   expectPasses("kzt_lpp266_vecm_fp0001.tar");
+}
+
+TEST_F(ActiveTest, ProductOfTheFileNameDecidesNotThatOfTheDescriptor) {
+  install("qalpp266.ver");
+  setRunning({{"qa", "11"}});
+  const auto passes = [&](const std::string &fileName, const std::string &product) {
+    const Processor processor = loaded(fileName, patchIni(product));
+    return printedBy([&] { return processor->checkForActivePrograms(nullptr); }).result;
+  };
+  EXPECT_FALSE(passes("kqa_lpp266_vems_fp0001.tar", "kxe"));
+  EXPECT_TRUE(passes("kxe_lpp266_vems_fp0001.tar", "kqa"));
 }
 
 TEST_F(ActiveTest, OtherProductsPassWhateverRuns) {

@@ -45,6 +45,12 @@ public:
   }
 };
 
+TEST_F(ProductExeTest, ExecutableItselfIsTheFileWhoseSmallLettersAreItsNameAsGiven) {
+  fill({"AgentX.bin"});
+  EXPECT_EQ(found("agentx.bin"), Names{});
+  EXPECT_EQ(found("AgentX.bin"), Names{"AgentX.bin"});
+}
+
 TEST_F(ProductExeTest, UpdateOnlyTraces) {
   fill({"agent_copy.bin"});
   const Processor kxe = naming("agent.bin");

@@ -240,6 +240,13 @@ TEST_F(HistoryTest, LongNamesAreNotCut) {
                                             padded(Util::getUserName(), 15) + " | <date>\n");
 }
 
+TEST_F(HistoryTest, ProductIsThatOfTheDescriptorPlatformAndTargetAreThoseOfTheFileName) {
+  loaded("KXE_unixware_vems_fp0009.tar", patchIni("KYN"))->updatePatchRegistry(true);
+  EXPECT_EQ(withoutDates(read(path())), HistoryHeader + "kyn | unixware | vems | " +
+                                            padded("KYN fix pack", 20) + " | PASS | " +
+                                            padded(Util::getUserName(), 15) + " | <date>\n");
+}
+
 TEST_F(HistoryTest, NameOfTwentyCharactersIsNotPadded) {
   const std::string name = "12345678901234567890";
   std::string ini = patchIni("kqa");

@@ -92,6 +92,28 @@ TEST_F(LoggerFailureTest, UnknownTimeIsNotThatOfAnEarlierLine) {
   EXPECT_EQ(read(glbLogFileName), before + "TRACE  (logger_test,5): timeless\n");
 }
 
+/// A moment, and how the lines of the log show it in the zone of the test.
+struct Moment {
+  time_t now;
+  const char *clock;
+};
+
+TEST_F(LoggerFailureTest, ClockOfALineIsThatOfItsMomentOfAnyDayAlsoWhenItIsSetBack) {
+  setenv("TZ", "UTC", 1);
+  logInit();
+  for (const Moment &moment :
+       {Moment{1000000, "13:46:40"}, Moment{999999, "13:46:39"}, Moment{86400, "00:00:00"},
+        Moment{43200, "12:00:00"}, Moment{1173131324, "21:48:44"}, Moment{3, "00:00:03"}}) {
+    const std::string before = read(glbLogFileName);
+    answerTime(moment.now);
+    setLine(5);
+    logTrace(LOG_COMPONENT, "told");
+    EXPECT_EQ(read(glbLogFileName), before + "TRACE " + moment.clock + " (logger_test,5): told\n");
+  }
+  unsetenv("TZ");
+  tzset();
+}
+
 TEST_F(LoggerFailureTest, UserWithoutAnEntryIsAnEmptyNameInTheHeader) {
   failCall("getpwuid", 0);
   logInit();

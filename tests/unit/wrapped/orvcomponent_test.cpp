@@ -58,6 +58,61 @@ TEST_F(ComponentFailureTest, HostThatRepeatsTheLocalNamesLetterIsTakenToo) {
   EXPECT_EQ(kox.getActiveInstances(), Names{"abc"});
 }
 
+TEST_F(ComponentFailureTest, LocalHostNameIsComparedInSmallLettersToo) {
+  answerNodeName("MyHost.example");
+  setRunning({{"ox", "11"}});
+  const ORVComponent kox(home(), "ox", "Sample", "06200000", "", {}, ORVComponent::TYPE_AGENT,
+                         "FIELDSEP=|\nmyhost|ox|11|a|x\nMYHOST.example|ox|11|b|x\nMyHost2|ox|11|c|x\n");
+  EXPECT_EQ(kox.getActiveInstances(), (Names{"a", "b", "c"}));
+}
+
+// KEEP(host-prefix)
+TEST_F(ComponentFailureTest, HostWithoutANameAcceptsTheRowsOfEveryHost) {
+  answerNodeName(".local");
+  setRunning({{"ox", "11"}});
+  const ORVComponent kox(home(), "ox", "Sample", "06200000", "", {}, ORVComponent::TYPE_AGENT,
+                         "FIELDSEP=|\nany|ox|11|a|x\n");
+  EXPECT_EQ(kox.getActiveInstances(), Names{"a"});
+}
+
+/// Who may start the instance of "another" decides the name of the user, whatever the number.
+struct Starter {
+  const char *name;
+  uid_t user;
+  const char *userName; ///< empty: the user has no entry
+  bool switches;
+};
+
+class StarterTest : public ComponentFailureTest, public ::testing::WithParamInterface<Starter> {};
+
+TEST_P(StarterTest, SwitchesToAnotherOwnerOnlyAsTheUserCalledRoot) {
+  const std::vector<RunRow> rows = {{"ox", "11", "abc", "another"}};
+  setRunning(rows);
+  ORVComponent kox(home(), "ox", "Sample", "06200000", "", {}, ORVComponent::TYPE_AGENT, runInfoText(rows));
+  answerUser(GetParam().user);
+  answerUserName(GetParam().userName);
+  if (*GetParam().userName == '\0')
+    failCall("getpwuid", 0);
+  failCall("execvp", ENOENT).on("/bin/su");
+  const int before = callsOf("fork");
+  PatchError err;
+  EXPECT_FALSE(kox.startInstance("abc", &err));
+  const Record refused = {20, "Unable to su to user: another"};
+  const Record failed = {13, "Unable to start instance abc of agent for product Sample."};
+  EXPECT_EQ(recordOf(err), GetParam().switches ? failed : refused);
+  EXPECT_EQ(callsOf("fork") - before, GetParam().switches ? 1 : 0);
+  EXPECT_EQ(journal(), Names{});
+}
+
+INSTANTIATE_TEST_SUITE_P(Users, StarterTest,
+                         ::testing::Values(Starter{"Root", 0, "root", true},
+                                           Starter{"RootOfNoNumber", 77, "root", true},
+                                           Starter{"SuperuserOfAnotherName", 0, "toor", false},
+                                           Starter{"Ordinary", 77, "quill", false},
+                                           Starter{"WithoutAName", 77, "", false},
+                                           Starter{"SuperuserWithoutAName", 0, "", false}),
+                         [](const auto &starter) { return starter.param.name; });
+
 std::string stopText(const std::string &subject, const std::string &kind) {
   return "Unable to stop " + subject + " for product Sample.  The " + kind +
          " for product Sample may be running under a different userid and must be manually stopped before "

@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include "patchhome.h"
@@ -47,6 +48,16 @@ TEST_F(RefusedTest, ArchiveIsCode3WhenTarCannotBeRun) {
             (LogLines{pp("PatchProcessor::extractINI() entry"), ppError(record.second),
                       pp("PatchProcessor::extractINI() = 0")}));
   EXPECT_EQ(Util::getCurrentDirectory(), before);
+}
+
+TEST_F(RefusedTest, HistoryShowsTheDateAndTheWholeClock) {
+  setenv("TZ", "UTC", 1);
+  tzset();
+  answerTime(1173131324);
+  processor()->updatePatchRegistry(true);
+  unsetenv("TZ");
+  tzset();
+  EXPECT_THAT(read(home() + "patchlogs/patches.hist"), ::testing::EndsWith(" | 03/05/2007 21:48:44\n"));
 }
 
 TEST_F(RefusedTest, WayBackFromAnExtractionIsNotLookedAt) {
