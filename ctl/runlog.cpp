@@ -354,13 +354,18 @@ void RunLog::readProgram(const LogMessage &message) {
     if (colon != std::string::npos)
       child_->words.push_back(text.substr(colon + 3));
   } else if (child_ && text == "runCommand exit") {
-    child_->seconds = clock_.seconds() - childBegan_;
-    childIsOver_ = true;
-    if (child_->words.size() == 3 && child_->words[0] == "tar")
-      archive_ = nameOf(child_->words[2]);
-    if (step_ && step_->step.patch.empty())
-      step_->step.patch = currentPatch();
+    endProgram();
   }
+}
+
+/// The archive that tar has unpacked tells the patch where the start of the log is lost.
+void RunLog::endProgram() {
+  child_->seconds = clock_.seconds() - childBegan_;
+  childIsOver_ = true;
+  if (child_->words.size() == 3 && child_->words[0] == "tar")
+    archive_ = nameOf(child_->words[2]);
+  if (step_ && step_->step.patch.empty())
+    step_->step.patch = currentPatch();
 }
 
 /// The line behind a program's end tells its status, when it is one of these.

@@ -127,6 +127,7 @@ private:
   void readPackages(const std::string &text);
   void readProcessor(const LogMessage &message);
   void readProgram(const LogMessage &message);
+  void endProgram();
   void readProgramStatus(const std::string &text);
   void beginStep(const char *name);
   bool readStepEnd(const std::string &text);
