@@ -1,6 +1,9 @@
 #include "checksums.h"
 
+#include <cerrno>
+#include <cstring>
 #include <fstream>
+#include <vector>
 
 #include "child.h"
 #include "judgement.h"
@@ -12,6 +15,26 @@ constexpr std::size_t DigestLength = 64;
 
 bool isDigest(const std::string &text) {
   return text.size() == DigestLength && text.find_first_not_of("0123456789abcdef") == std::string::npos;
+}
+
+/// Two blanks, or a blank and an asterisk for what was read as binary, stand behind the digest.
+bool isEntryOf(const std::string &line, const std::string &fileName) {
+  return line.size() > DigestLength + 2 && isDigest(Util::toLower(line.substr(0, DigestLength))) &&
+         line[DigestLength] == ' ' && (line[DigestLength + 1] == ' ' || line[DigestLength + 1] == '*') &&
+         line.substr(DigestLength + 2) == fileName;
+}
+
+/// None of a list that does not exist.
+std::vector<std::string> linesOf(const std::string &list) {
+  std::ifstream file(list, std::ios::binary);
+  if (!file && errno != ENOENT)
+    throw JudgementError("cannot read " + list + ": " + strerror(errno));
+  std::vector<std::string> lines;
+  for (std::string line; std::getline(file, line);)
+    lines.push_back(line);
+  if (file.bad())
+    throw JudgementError("cannot read " + list);
+  return lines;
 }
 
 } // namespace
@@ -27,14 +50,17 @@ std::string sha256OfFile(const std::string &path) {
 }
 
 std::string listedChecksum(const std::string &list, const std::string &fileName) {
-  std::ifstream file(list, std::ios::binary);
-  for (std::string line; std::getline(file, line);) {
-    const std::string digest = Util::toLower(line.substr(0, DigestLength));
-    // Two blanks, or a blank and an asterisk for what was read as binary.
-    const bool isEntry = isDigest(digest) && line.size() > DigestLength + 2 && line[DigestLength] == ' ' &&
-                         (line[DigestLength + 1] == ' ' || line[DigestLength + 1] == '*');
-    if (isEntry && line.substr(DigestLength + 2) == fileName)
-      return digest;
-  }
+  for (const std::string &line : linesOf(list))
+    if (isEntryOf(line, fileName))
+      return Util::toLower(line.substr(0, DigestLength));
   return "";
+}
+
+std::string checksumListWith(const std::string &list, const std::string &fileName,
+                             const std::string &digest) {
+  std::string text;
+  for (const std::string &line : linesOf(list))
+    if (!isEntryOf(line, fileName))
+      text += line + "\n";
+  return text + digest + "  " + fileName + "\n";
 }

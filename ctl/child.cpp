@@ -1,8 +1,10 @@
 #include "child.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <csignal>
 #include <cstring>
+#include <thread>
 
 #include <fcntl.h>
 #include <spawn.h>
@@ -59,11 +61,13 @@ std::vector<char *> pointers(std::vector<std::string> &texts) {
 /// What the child's descriptors and signals are: set up before, released after the start.
 class SpawnSetup {
 public:
-  SpawnSetup(const Capture &out, const Capture &err) {
+  SpawnSetup(const Capture &out, const Capture &err, const std::string &directory) {
     posix_spawn_file_actions_init(&files_);
     posix_spawn_file_actions_addopen(&files_, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
     posix_spawn_file_actions_adddup2(&files_, out.fd(), STDOUT_FILENO);
     posix_spawn_file_actions_adddup2(&files_, err.fd(), STDERR_FILENO);
+    if (!directory.empty())
+      posix_spawn_file_actions_addchdir_np(&files_, directory.c_str());
     sigset_t all;
     sigset_t none;
     sigfillset(&all);
@@ -88,6 +92,21 @@ private:
   posix_spawnattr_t attributes_ = {};
 };
 
+/// Waits for the end, without taking the status; false when the time is over before.
+bool hasEnded(pid_t child, std::chrono::seconds limit) {
+  const auto end = std::chrono::steady_clock::now() + limit;
+  auto pause = std::chrono::microseconds(200);
+  siginfo_t info = {};
+  while (waitid(P_PID, static_cast<id_t>(child), &info, WEXITED | WNOWAIT | WNOHANG) == 0 &&
+         info.si_pid == 0) {
+    if (std::chrono::steady_clock::now() > end)
+      return false;
+    std::this_thread::sleep_for(pause);
+    pause = std::min(2 * pause, std::chrono::microseconds(20000));
+  }
+  return true;
+}
+
 int statusOf(pid_t child) {
   int status = 0;
   while (waitpid(child, &status, 0) < 0)
@@ -101,10 +120,10 @@ int statusOf(pid_t child) {
 ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironment &environment) {
   const std::string program = findProgram(words.front(), environment.path);
   if (program.empty())
-    return {127, "", words.front() + ": not found\n"};
+    return {127, "", words.front() + ": not found\n", true};
   const Capture out;
   const Capture err;
-  const SpawnSetup setup(out, err);
+  const SpawnSetup setup(out, err, environment.directory);
   std::vector<std::string> arguments = words;
   std::vector<std::string> variables = environment.variables;
   variables.push_back("PATH=" + environment.path);
@@ -114,9 +133,12 @@ ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironme
   if (error == EAGAIN || error == ENOMEM)
     throw JudgementError("cannot run " + program + ": " + strerror(error));
   if (error != 0)
-    return {127, "", program + ": " + strerror(error) + "\n"};
+    return {127, "", program + ": " + strerror(error) + "\n", true};
+  const bool isInTime = environment.limit.count() == 0 || hasEnded(child, environment.limit);
+  if (!isInTime)
+    kill(child, SIGKILL);
   const int status = statusOf(child);
-  return {status, out.text(), err.text()};
+  return {status, out.text(), err.text(), isInTime};
 }
 
 std::string findProgram(const std::string &name, const std::string &path) {

@@ -1,6 +1,7 @@
 // Programs that this one runs: with an environment of its own making, their output kept whole.
 #pragma once
 
+#include <chrono>
 #include <string>
 #include <vector>
 
@@ -9,12 +10,15 @@ struct ChildResult {
       0; ///< exit status; 128 and the number of the signal that ended it; 127 when it could not be started
   std::string out;
   std::string err;
+  bool isInTime = true; ///< false when it was killed at the limit of its time
 };
 
 /// What a child inherits: nothing of the caller's environment but these, and default dispositions of signals.
 struct ChildEnvironment {
   std::string path;                   ///< PATH
   std::vector<std::string> variables; ///< further ones, "NAME=value"
+  std::string directory = {};         ///< the current one; empty: the caller's
+  std::chrono::seconds limit{0};      ///< its time; 0: as long as it takes
 };
 
 /// Runs words[0], an absolute path or a name looked up in the environment's PATH, with /dev/null as standard

@@ -55,13 +55,14 @@ void readMembers(Patch &patch) {
     patch.members.push_back(member);
   }
   patch.archiveProblem = reader.problem();
+  patch.hasEndMark = patch.archiveProblem.empty() && reader.hasEndMark();
 }
 
 } // namespace
 
 Patch readPatch(const std::string &path) {
   const std::string file = File(path).getName();
-  Patch patch{path, file, PatchFileName(file), {}, "", false, "", nullptr, {}};
+  Patch patch{path, file, PatchFileName(file), {}, "", false, "", nullptr, {}, false};
   readMembers(patch);
   if (patch.hasDescriptor) {
     const MemoryFile descriptor(patch.descriptorText);

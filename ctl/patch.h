@@ -24,6 +24,7 @@ struct Patch {
   /// Null without a valid descriptor; `descriptorError` then has the installer's own message.
   std::unique_ptr<PatchDescriptor> descriptor;
   PatchError descriptorError;
+  bool hasEndMark = false; ///< the archive was read up to an empty block, which ends it
 };
 
 /// Reads one patch file. JudgementError when it cannot be opened.

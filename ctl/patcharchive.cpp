@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
+#include <new>
 
 #include <archive.h>
 #include <archive_entry.h>
@@ -33,6 +34,17 @@ std::string textOf(const char *text) {
   return text == nullptr ? "" : text;
 }
 
+/// What tar(1) recognises, and nothing that would be handed to another program.
+void supportFilters(archive *reader) {
+  archive_read_support_filter_bzip2(reader);
+  archive_read_support_filter_compress(reader);
+  archive_read_support_filter_gzip(reader);
+  archive_read_support_filter_lzip(reader);
+  archive_read_support_filter_lzma(reader);
+  archive_read_support_filter_xz(reader);
+  archive_read_support_filter_zstd(reader);
+}
+
 Member memberOf(archive_entry *entry) {
   Member member;
   member.name = textOf(archive_entry_pathname(entry));
@@ -53,21 +65,33 @@ void ArchiveReader::Close::operator()(archive *reader) const {
   archive_read_free(reader);
 }
 
-ArchiveReader::ArchiveReader(const std::string &path) : reader_(archive_read_new()) {
+ArchiveReader::ArchiveReader(const std::string &path) : path_(path), reader_(archive_read_new()) {
   struct stat status = {};
   if (stat(path.c_str(), &status) != 0)
     throw JudgementError("cannot read " + path + ": " + strerror(errno));
   if (!S_ISREG(status.st_mode))
     throw JudgementError("no regular file: " + path);
-  archive_read_support_filter_all(reader_.get());
+  supportFilters(reader_.get());
   archive_read_support_format_tar(reader_.get());
   archive_read_support_format_empty(reader_.get());
-  if (archive_read_open_filename(reader_.get(), path.c_str(), BlockSize) != ARCHIVE_OK) {
-    const int error = archive_errno(reader_.get());
-    if (error == EACCES || error == ENOENT || error == EIO)
-      throw JudgementError("cannot read " + path + ": " + strerror(error));
-    problem_ = textOf(archive_error_string(reader_.get()));
-  }
+  if (archive_read_open_filename(reader_.get(), path.c_str(), BlockSize) != ARCHIVE_OK)
+    noteProblem();
+}
+
+/// libarchive numbers the faults of an archive -1, EILSEQ and EINVAL; any other number is that of a system
+/// call.
+void ArchiveReader::noteProblem() {
+  const int error = archive_errno(reader_.get());
+  const std::string text = textOf(archive_error_string(reader_.get()));
+  if (error == ENOMEM)
+    throw std::bad_alloc();
+  if (error > 0 && error != EILSEQ && error != EINVAL)
+    throw JudgementError("cannot read " + path_ + ": " + text);
+  problem_ = text.empty() ? "damaged" : text;
+}
+
+bool ArchiveReader::hasEndMark() const {
+  return archive_filter_bytes(reader_.get(), 0) > archive_read_header_position(reader_.get());
 }
 
 bool ArchiveReader::next(Member &member) {
@@ -78,7 +102,7 @@ bool ArchiveReader::next(Member &member) {
   if (result == ARCHIVE_EOF)
     return false;
   if (result != ARCHIVE_OK && result != ARCHIVE_WARN) {
-    problem_ = textOf(archive_error_string(reader_.get()));
+    noteProblem();
     return false;
   }
   member = memberOf(entry);
@@ -89,7 +113,7 @@ std::size_t ArchiveReader::read(char *buffer, std::size_t size) {
   const la_ssize_t count = archive_read_data(reader_.get(), buffer, size);
   if (count >= 0)
     return static_cast<std::size_t>(count);
-  problem_ = textOf(archive_error_string(reader_.get()));
+  noteProblem();
   return 0;
 }
 

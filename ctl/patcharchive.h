@@ -35,13 +35,20 @@ public:
   std::size_t read(char *buffer, std::size_t size);
   /// The content of the current member, at most `limit` bytes of it.
   std::string content(std::size_t limit);
-  /// Why reading ended before the end; empty when all was read.
+  /// Why reading ended before the end; empty when all was read. A read error is no property of the archive:
+  /// next() and read() throw a JudgementError.
   const std::string &problem() const { return problem_; }
+  /// Once next() was false without a problem: whether an empty block stood where the next member would. An
+  /// archive that was cut off between two members ends without it.
+  bool hasEndMark() const;
 
 private:
+  void noteProblem();
+
   struct Close {
     void operator()(archive *reader) const;
   };
+  std::string path_;
   std::unique_ptr<archive, Close> reader_;
   std::string problem_;
 };

@@ -15,16 +15,22 @@ namespace fs = std::filesystem;
 void openDirectories(const fs::path &folder) {
   std::error_code ignored;
   fs::permissions(folder, fs::perms::owner_all, fs::perm_options::add, ignored);
-  for (const fs::directory_entry &entry : fs::directory_iterator(folder, ignored))
-    if (entry.symlink_status(ignored).type() == fs::file_type::directory)
-      openDirectories(entry.path());
+  for (fs::directory_iterator entry(folder, ignored); entry != fs::directory_iterator();
+       entry.increment(ignored))
+    if (entry->symlink_status(ignored).type() == fs::file_type::directory)
+      openDirectories(entry->path());
+}
+
+std::string systemFolder() {
+  const char *const folder = getenv("TMPDIR");
+  return folder == nullptr || *folder == '\0' ? "/tmp" : folder;
 }
 
 } // namespace
 
-TemporaryFolder::TemporaryFolder() {
-  const char *const parent = getenv("TMPDIR");
-  path_ = std::string(parent == nullptr || *parent == '\0' ? "/tmp" : parent) + "/orvpatchctl.XXXXXX";
+TemporaryFolder::TemporaryFolder() : TemporaryFolder(systemFolder()) {}
+
+TemporaryFolder::TemporaryFolder(const std::string &parent) : path_(parent + "/orvpatchctl.XXXXXX") {
   if (mkdtemp(path_.data()) == nullptr)
     throw JudgementError("cannot make a folder for temporary files: " + path_ + ": " + strerror(errno));
 }

@@ -7,6 +7,8 @@ class TemporaryFolder {
 public:
   /// Below TMPDIR, or /tmp; JudgementError when none can be made.
   TemporaryFolder();
+  /// Below this folder.
+  explicit TemporaryFolder(const std::string &parent);
   TemporaryFolder(const TemporaryFolder &) = delete;
   TemporaryFolder &operator=(const TemporaryFolder &) = delete;
   ~TemporaryFolder();

@@ -6,6 +6,7 @@ class App;
 }
 struct Invocation;
 
+void addLint(CLI::App &application, Invocation &invocation);
 void addShow(CLI::App &application, Invocation &invocation);
 void addStatus(CLI::App &application, Invocation &invocation);
 void addHistory(CLI::App &application, Invocation &invocation);

@@ -61,6 +61,10 @@ class RawArchive:
         member.type = kind
         for field, value in fields.items():
             setattr(member, field, value)
+        return self.add(member, data)
+
+    def add(self, member, data=b""):
+        """A member of any fields at all."""
         self._tar.addfile(member, io.BytesIO(data))
         self.boundaries.append(self._stream.tell())
         return self

@@ -89,7 +89,8 @@ class Patch:
         with tempfile.TemporaryDirectory(prefix="orvpatch-archive-") as folder:
             self._fill(Path(folder))
             members = ["."] if dotted else sorted(os.listdir(folder)) or ["--files-from=/dev/null"]
-            subprocess.run(["tar", "-cf", target.absolute(), "-C", folder, *members], check=True)
+            subprocess.run(["tar", "--owner=0", "--group=0", "-cf", target.absolute(), "-C", folder, *members],
+                           check=True)
         return target
 
     def _add(self, path, make):

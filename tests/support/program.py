@@ -43,7 +43,7 @@ class Program:
     def argv(self):
         return [*self.runner, str(self.binary)]
 
-    def _argv_for(self, user):
+    def argv_for(self, user):
         """A checkout may be closed to other users (below /root, say): they run a copy of the binary."""
         if user is None or all(folder.stat().st_mode & 0o001 for folder in self.binary.parents):
             return self.argv
@@ -63,7 +63,7 @@ class Program:
         wrapper  command words put in front of everything, such as ["strace", "-f"]
         """
         process = subprocess.Popen(
-            [*wrapper, *self._argv_for(user), *map(os.fsdecode, arguments)], stdin=stdin, stdout=subprocess.PIPE,
+            [*wrapper, *self.argv_for(user), *map(os.fsdecode, arguments)], stdin=stdin, stdout=subprocess.PIPE,
             stderr=subprocess.PIPE, cwd=cwd, env=_environment(env), start_new_session=True,
             preexec_fn=(lambda: [os.close(fd) for fd in close]) if close else None, **identity(user))
         try:
