@@ -15,6 +15,8 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
       "orvpatchctl");
   application->set_version_flag("--version", "orvpatchctl " ORVPATCHCTL_VERSION);
   application->require_subcommand(1);
+  addNew(*application, invocation);
+  addBuild(*application, invocation);
   addLint(*application, invocation);
   addShow(*application, invocation);
   addStatus(*application, invocation);

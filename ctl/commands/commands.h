@@ -6,7 +6,9 @@ class App;
 }
 struct Invocation;
 
+void addBuild(CLI::App &application, Invocation &invocation);
 void addLint(CLI::App &application, Invocation &invocation);
+void addNew(CLI::App &application, Invocation &invocation);
 void addShow(CLI::App &application, Invocation &invocation);
 void addStatus(CLI::App &application, Invocation &invocation);
 void addHistory(CLI::App &application, Invocation &invocation);
