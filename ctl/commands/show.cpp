@@ -1,5 +1,6 @@
 // show: the patch as the installer will read it.
 #include <cstdio>
+#include <map>
 
 #include <CLI/CLI.hpp>
 #include <nlohmann/json.hpp>
@@ -9,6 +10,7 @@
 #include "file.h"
 #include "patch.h"
 #include "text.h"
+#include "updatedfiles.h"
 
 namespace {
 
@@ -39,23 +41,18 @@ Json dependents(const PatchDescriptor &descriptor) {
   return textList(codes);
 }
 
+/// Everything below updated_files but directories: all of it is moved into the home.
 Json files(const Patch &patch) {
-  static const std::string root = "updated_files/";
   Json list = Json::array();
-  for (const Member &member : patch.members) {
-    const std::string path = relativePath(member.name);
-    if (member.type == Member::Type::File && path.compare(0, root.size(), root) == 0)
-      list.push_back({{"path", jsonText(path.substr(root.size()))},
-                      {"size", member.size},
-                      {"mode", octalMode(member.mode)}});
+  for (const auto &[path, index] : updatedFiles(patch.members)) {
+    const Member &member = patch.members[index];
+    if (member.type != Member::Type::Directory)
+      list.push_back({{"path", jsonText(path)}, {"size", member.size}, {"mode", octalMode(member.mode)}});
   }
   return list;
 }
 
 Json describe(const Patch &patch) {
-  if (patch.descriptor == nullptr)
-    throw JudgementError(patch.file + ": " +
-                         (patch.hasDescriptor ? patch.descriptorError.text : "no member patch.ini"));
   const PatchDescriptor &descriptor = *patch.descriptor;
   return {{"file", jsonText(patch.file)},
           {"product", jsonText(descriptor.getProductCode())},
@@ -74,13 +71,106 @@ Json describe(const Patch &patch) {
           {"files", files(patch)}};
 }
 
+void printLine(const char *label, const std::string &text) {
+  printf("  %-14s  %s\n", label, text.empty() ? "none" : terminalText(text).c_str());
+}
+
+/// One line for each, the label on the first.
+void printList(const char *label, const std::vector<std::string> &texts) {
+  if (texts.empty())
+    printLine(label, "");
+  for (const std::string &text : texts) {
+    printLine(label, text);
+    label = "";
+  }
+}
+
+std::vector<std::string> prerequisiteTexts(const PatchDescriptor &descriptor) {
+  std::vector<std::string> texts;
+  for (const std::string &code : descriptor.getPrereqs()) {
+    Version level;
+    static_cast<void>(descriptor.getPrereqVersion(code, level));
+    texts.push_back(code + " from " + level.getDottedVersionString());
+  }
+  return texts;
+}
+
+const char *kindWords(const std::string &target) {
+  static const std::map<std::string, const char *> words = {{"vema", "agent"},
+                                                            {"vems", "monitoring server"},
+                                                            {"veps", "portal server"},
+                                                            {"vepd", "portal desktop client"},
+                                                            {"vecm", "command-line component"}};
+  const auto found = words.find(target);
+  return found == words.end() ? "no kind" : found->second;
+}
+
+void printFiles(const Patch &patch) {
+  std::size_t count = 0;
+  std::int64_t size = 0;
+  for (const auto &[path, index] : updatedFiles(patch.members)) {
+    const Member &member = patch.members[index];
+    if (member.type == Member::Type::Directory)
+      continue;
+    ++count;
+    size += member.size;
+  }
+  printLine("Files", count == 0 ? "" : std::to_string(count) + ", " + std::to_string(size) + " bytes");
+  for (const auto &[path, index] : updatedFiles(patch.members)) {
+    const Member &member = patch.members[index];
+    if (member.type != Member::Type::Directory)
+      printf("    %s  %12lld  %s\n", octalMode(member.mode).c_str(), static_cast<long long>(member.size),
+             terminalText(path).c_str());
+  }
+}
+
+void print(const Patch &patch) {
+  const PatchDescriptor &descriptor = *patch.descriptor;
+  const std::vector<std::string> dependents = descriptor.getDependents();
+  const bool isForAll = !dependents.empty() && dependents.front() == "all";
+  printf("%s\n", terminalText(patch.file).c_str());
+  printLine("Product", descriptor.getProductCode() + " on " + patch.name.getFullPlatform());
+  printLine("Kind", patch.name.getTarget() + ", " + kindWords(patch.name.getTarget()));
+  printLine("Name", descriptor.getPatchName());
+  printLine("Description", descriptor.getPatchDescriptiveName());
+  printLine("Level", descriptor.getVersion()->getDottedVersionString());
+  printList("Prerequisites", prerequisiteTexts(descriptor));
+  printList("Dependents", isForAll ? std::vector<std::string>{"all agents"} : dependents);
+  printList("Before stops", descriptor.getPrePatchCommands());
+  printList("Before files", descriptor.getPreCommands());
+  printList("Before starts", descriptor.getPostCommands());
+  printFiles(patch);
+}
+
+/// The patch, which has a descriptor that the installer accepts.
+Patch readValidPatch(const std::string &file) {
+  Patch patch = readPatch(file);
+  if (patch.descriptor == nullptr)
+    throw JudgementError(patch.file + ": " +
+                         (patch.hasDescriptor ? patch.descriptorError.text : "no member patch.ini"));
+  return patch;
+}
+
+void printAll(const std::vector<Patch> &patches) {
+  for (const Patch &patch : patches) {
+    if (&patch != &patches.front())
+      printf("\n");
+    print(patch);
+  }
+}
+
 void show(const std::string &path, Invocation &invocation) {
-  Json patches = Json::array();
+  std::vector<Patch> patches;
   for (const std::string &file : patchFiles(path))
-    patches.push_back(describe(readPatch(file)));
-  const bool isOne = patches.size() == 1 && !File(path).isDirectory();
-  if (invocation.output.json)
-    printDocument(isOne ? patches.front() : patches);
+    patches.push_back(readValidPatch(file));
+  if (!invocation.output.json) {
+    printAll(patches);
+    return;
+  }
+  Json list = Json::array();
+  for (const Patch &patch : patches)
+    list.push_back(describe(patch));
+  printDocument(File(path).isDirectory() ? list : list.front());
 }
 
 } // namespace
