@@ -11,11 +11,15 @@ _orvpatchctl() {
   COMPREPLY=()
   # The value of an option.
   case $previous in
+    --output)
+      _orvpatchctl_offer -d "$word"
+      return
+      ;;
     --color)
       mapfile -t COMPREPLY < <(compgen -W 'auto always never' -- "$word")
       return
       ;;
-    --product | --since)
+    --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since)
       :
       return
       ;;
@@ -23,7 +27,7 @@ _orvpatchctl() {
   # The command, and the number of its arguments before the cursor.
   for ((place = 1; place < COMP_CWORD; place++)); do
     case ${COMP_WORDS[place]} in
-      --color | --product | --since) ((place++)) ;;
+      --output | --color | --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since) ((place++)) ;;
       -*) ;;
       *) if [[ -z $command ]]; then command=${COMP_WORDS[place]}; else ((count++)); fi ;;
     esac
@@ -31,6 +35,19 @@ _orvpatchctl() {
   case $command in
     '')
       options='--help --version'
+      ;;
+    new)
+      options='--help --json --color --product --level --name --description'
+      kinds=(d)
+      ;;
+    build)
+      options='--help --json --color --output --platform --target --fixpack --sign'
+      kinds=(d)
+      ;;
+    lint)
+      options='--help --json --color --explain --strict'
+      kinds=(f)
+      ((count < 1)) || count=0
       ;;
     show)
       options='--help --json --color'
@@ -56,7 +73,7 @@ _orvpatchctl() {
   if [[ $word == -* ]]; then
     mapfile -t COMPREPLY < <(compgen -W "$options" -- "$word")
   elif [[ -z $command ]]; then
-    mapfile -t COMPREPLY < <(compgen -W 'show status history verify log' -- "$word")
+    mapfile -t COMPREPLY < <(compgen -W 'new build lint show status history verify log' -- "$word")
   elif [[ ${kinds[count]:--} != - ]]; then
     _orvpatchctl_offer "-${kinds[count]}" "$word"
   fi

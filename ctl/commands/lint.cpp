@@ -76,8 +76,7 @@ void addLint(CLI::App &application, Invocation &invocation) {
   CLI::App *const command = addCommand(application, invocation, "lint",
                                        "Tell what is wrong with patches before they are installed");
   const auto options = std::make_shared<LintOptions>();
-  command->add_option("patch", options->patches, "Patch files, or directories of them")
-      ->option_text("PATCH...");
+  command->add_option("patch", options->patches, "Patch files, or directories of them")->option_text("PATCH");
   command->add_option("--explain", options->explained, "Print a rule with its reason and remedy, or all")
       ->option_text("RULE");
   command->add_flag("--strict", options->isStrict, "Status 1 for warnings too");
