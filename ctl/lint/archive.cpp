@@ -8,7 +8,7 @@
 namespace {
 
 /// As much as an ordinary user's pipe holds at most.
-constexpr std::size_t MostOutput = 1024 * 1024;
+constexpr std::size_t MostOutput = std::size_t{1024} * 1024;
 
 bool isTooLoud(const ChildResult &tar) {
   return tar.out.size() > MostOutput || tar.err.size() > MostOutput;
@@ -26,7 +26,7 @@ std::string firstLine(const std::string &text) {
 std::string placeOfDescriptor(const Subject &subject) {
   for (const Member &member : subject.patch.members)
     if (relativePath(member.name) == "patch.ini" && member.type == Member::Type::File)
-      return "the descriptor is named \"" + member.name + "\", not \"patch.ini\"";
+      return "the descriptor is named \"" + member.name + R"(", not "patch.ini")";
   return subject.byPath.count("patch.ini") != 0 ? "the member patch.ini is no file" : "no member patch.ini";
 }
 

@@ -87,7 +87,7 @@ bool isNumbered(const std::vector<std::string> &commands) {
 
 void commandCut(const Subject &subject, Finder &found) {
   findFault(subject, found, Fault::Cut, [](const IniEntry &entry) {
-    return "\"" + entry.text + "\" is cut at \"=\": the program \"" + entry.key + "\" is run";
+    return "\"" + entry.text + R"(" is cut at "=": the program ")" + entry.key + "\" is run";
   });
 }
 

@@ -39,13 +39,13 @@ bool hasTrailingComment(const std::string &text) {
 /// The other INI dialect that the line is written in; null when it is plain.
 const char *foreignFormOf(const IniEntry &entry) {
   if (entry.text.front() == ';')
-    return "\";\" begins no comment here";
+    return R"(";" begins no comment here)";
   if (hasTrailingComment(entry.text))
     return "a comment behind an entry belongs to the entry";
   if (isQuoted(entry.value) || isQuoted(entry.key))
     return "quotes belong to the text";
   if (entry.text.back() == '\\')
-    return "a line is not continued by \"\\\"";
+    return R"(a line is not continued by "\")";
   return nullptr;
 }
 

@@ -249,6 +249,10 @@ def fails_after_the_first_commands(stage):
     assert stage.home.calls() == ["10_first.sh"]
 
 
+def of_tomorrow():
+    return RawArchive(Patch("ox")).file("updated_files/bin/tool", mtime=int(time.time()) + 48 * HOUR)
+
+
 def of_the_future(stage):
     assert stage.install().status == 0
     assert any("in the future" in line for line in stage.home.log().messages("TRACE"))
@@ -438,9 +442,7 @@ CASES = [
     Case("prereq-in-same-set", prerequisite_beside_it, none_is_installed),
     Case("companion-is-patch", with_a_digest_beside_it, fails_for_the_digest),
     Case("no-checksum", not_listed, installed_unseen),
-    Case("future-time", writes(lambda: RawArchive(Patch("ox")).file("updated_files/bin/tool",
-                                                                   mtime=int(time.time()) + 48 * HOUR)),
-         of_the_future),
+    Case("future-time", writes(of_tomorrow), of_the_future),
     Case("no-updated-files", writes(lambda: Patch("ox")), report_ends_early),
     Case("command-order", two_commands, runs_in_the_order_of_bytes),
     Case("foreign-syntax", writes(lambda: patch(descriptor(name='"kox_fp0001"'))), quotes_in_the_history),
