@@ -91,7 +91,7 @@ void supportPatch(const Subject &subject, Finder &found) {
 void vecmProduct(const Subject &subject, Finder &found) {
   const std::string product = productOf(subject.patch);
   if (subject.patch.name.isValid() && subject.patch.name.getTarget() == "vecm" && product != "kzt")
-    found("", "the command-line component is \"kzt\", not \"" + product + "\"");
+    found("", R"(the command-line component is "kzt", not ")" + product + "\"");
 }
 
 void prereqKind(const Subject &subject, Finder &found) {
@@ -133,7 +133,7 @@ void allIsHidden(const Subject &subject, Finder &found) {
     return;
   const std::vector<std::string> codes = subject.patch.descriptor->getDependents();
   if (std::find(codes.begin(), codes.end(), "all") != codes.end() && codes.front() != "all")
-    found("patch.ini", "\"" + codes.front() + "\" sorts before \"all\", which then is the code of a product");
+    found("patch.ini", "\"" + codes.front() + R"(" sorts before "all", which then is the code of a product)");
 }
 
 void productExeUnused(const Subject &subject, Finder &found) {

@@ -253,7 +253,7 @@ std::vector<LintRule> warnings() {
        commandOrder,
        nullptr},
       {{"foreign-syntax", Warning, "An entry is written as in another kind of INI file.",
-        "Comments behind an entry, \";\", quotes and \"\\\" at the end of a line are ordinary text here.",
+        R"(Comments behind an entry, ";", quotes and "\" at the end of a line are ordinary text here.)",
         "Leave them out; a comment is a line that begins with \"#\"."},
        foreignSyntax,
        nullptr},
