@@ -80,8 +80,12 @@ class Combination:
         self.second_kill = chance.choice(kills_of(bench)) if chance.random() < 1 / 3 else None
 
     def _add(self, fault, names):
-        """One fault for calls of each name is what can be injected at a time."""
-        if fault.call not in names and not fault.spares_the_log:
+        """One fault for calls of each name is what can be injected at a time.
+
+        A close is left out: an injected failure keeps the descriptor open, which no real one does, so that a pipe
+        with a second fault on it could be waited on for ever.
+        """
+        if fault.call not in names and fault.call != "close" and not fault.spares_the_log:
             self.faults.append(fault)
             names.add(fault.call)
 
