@@ -54,6 +54,8 @@ public:
   /// instance that was not found running.
   std::string getPid(const std::string &instance) const { return lookUp(pids_, instance); }
   std::string getOwner(const std::string &instance) const { return lookUp(owners_, instance); }
+  /// Who is to own an instance when it is started again, for a caller that knows it from a record.
+  void setOwner(const std::string &instance, const std::string &owner) { owners_[instance] = owner; }
 
 protected:
   /// How a failed start or stop is reported: with the instance's name or without.

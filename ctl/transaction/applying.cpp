@@ -1,0 +1,227 @@
+#include "transaction/applying.h"
+
+#include <algorithm>
+#include <chrono>
+#include <ctime>
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "commands/command.h"
+#include "homelock.h"
+#include "inputfile.h"
+#include "packages.h"
+#include "text.h"
+#include "transaction/changes.h"
+#include "transaction/instances.h"
+#include "transaction/place.h"
+#include "transaction/plan.h"
+#include "transaction/saving.h"
+#include "transaction/taking.h"
+#include "transaction/undoing.h"
+#include "utilities.h"
+#include "verification.h"
+
+namespace {
+
+constexpr std::size_t LargestOutput = 64UL * 1024 * 1024;
+
+std::string outputIn(const std::string &file) {
+  return InputFile(file).content(LargestOutput);
+}
+
+bool bringsCommands(const Patch &patch) {
+  const PatchDescriptor &descriptor = *patch.descriptor;
+  return !(descriptor.getPrePatchCommands().empty() && descriptor.getPreCommands().empty() &&
+           descriptor.getPostCommands().empty());
+}
+
+class Transaction {
+public:
+  Transaction(const Home &home, const ApplyOptions &options, const ApplyDialogue &dialogue,
+              const std::vector<std::string> &messages)
+      : home_(home), options_(options), dialogue_(dialogue), place_(home.path()), id_(place_.create()),
+        folder_(place_.folderOf(id_)) {
+    record_.id = id_;
+    record_.action = "apply";
+    record_.home = home.path();
+    record_.user = Util::getUserName();
+    record_.started = utcTime(std::time(nullptr));
+    record_.dryRun = options.dryRun;
+    record_.messages = messages;
+  }
+
+  Record run(const std::string &path) {
+    try {
+      if (!prepare(path))
+        return refused();
+    } catch (...) {
+      place_.remove(id_);
+      throw;
+    }
+    outlastInterruptions();
+    install();
+    if (record_.verdict != "applied" && options_.undoOnFailure)
+      step("undo", [this] { return undo(); });
+    finish();
+    return record_;
+  }
+
+private:
+  /// Runs one step, and notes how long it took and how it ended.
+  template <class Work>
+  bool step(const char *name, Work work) {
+    dialogue_.begins(name);
+    const auto start = std::chrono::steady_clock::now();
+    const bool good = work();
+    const std::chrono::duration<double> seconds = std::chrono::steady_clock::now() - start;
+    record_.steps.push_back({name, seconds.count(), good ? "ok" : "failed"});
+    return good;
+  }
+
+  /// All that comes before the first change; false when it is refused.
+  bool prepare(const std::string &path) {
+    step("take", [&] {
+      taken_ = takePatches(path, folder_ + "/patches");
+      return true;
+    });
+    if (!step("check", [&] { return check(path); }))
+      return false;
+    const std::vector<Patch> patches = applicablePatches(home_, taken_);
+    planInstallation(home_, patches, record_);
+    if (options_.dryRun || !dialogue_.agree(record_))
+      return false;
+    hasCommands_ = std::any_of(patches.begin(), patches.end(), bringsCommands);
+    if (hasCommands_)
+      changes_.lookBefore(home_, record_);
+    writeRecord(folder_, record_);
+    return step("save", [this] {
+      saveFiles(home_.path(), folder_, record_);
+      return true;
+    });
+  }
+
+  bool check(const std::string &original) {
+    CheckOptions options = options_.check;
+    options.original = original;
+    options.isLockHeld = true;
+    record_.findings = checkInstallation(home_, taken_, options).findings;
+    return count(record_.findings, Severity::Error) == 0;
+  }
+
+  void install() {
+    record_.phase = Phase::Installing;
+    writeRecord(folder_, record_);
+    const bool installed = step("install", [this] { return runInstaller(); });
+    noteInstalled(home_.path(), record_);
+    record_.phase = Phase::Installed;
+    writeRecord(folder_, record_);
+    const bool verified = step("verify", [this] { return verify(); });
+    step("start", [this] {
+      startMissing(home_, record_.before, record_.messages);
+      return true;
+    });
+    step("directories", [this] {
+      closeDirectories(home_.path(), record_);
+      return true;
+    });
+    record_.after = runningInstances(home_);
+    noteMissingInstances();
+    if (hasCommands_)
+      record_.otherChanges = changes_.others(home_, record_);
+    record_.verdict = !installed                                ? "failed"
+                      : verified && record_.differences.empty() ? "applied"
+                                                                : "incomplete";
+  }
+
+  bool runInstaller() {
+    const InstallerOptions &options = options_.check.installer;
+    umask(022);
+    BackgroundChild child({findInstaller(options), "-h", home_.path(), "-i", taken_},
+                          installerEnvironment(options), folder_ + "/stdout", folder_ + "/stderr");
+    while (!child.hasEnded(200))
+      dialogue_.begins("");
+    record_.installer = {child.status(), outputIn(folder_ + "/stdout"), outputIn(folder_ + "/stderr")};
+    noteResults(home_, record_);
+    return child.status() == 0;
+  }
+
+  /// Every patch against the home, and mode and owner of each file against what was there before.
+  bool verify() {
+    Verification verification = verifyPatches(home_, applicablePatches(home_, taken_));
+    verifyAttributes(record_, verification);
+    record_.differences = verification.differences;
+    return verification.differences.empty();
+  }
+
+  void noteMissingInstances() {
+    for (const RecordedInstance &before : record_.before)
+      if (std::none_of(record_.after.begin(), record_.after.end(), [&before](const RecordedInstance &now) {
+            return now.product == before.product && now.name == before.name;
+          }))
+        record_.differences.push_back({before.product + (before.name.empty() ? "" : " " + before.name),
+                                       "instance", "it ran before, and does not run now"});
+  }
+
+  bool undo() {
+    const bool undone = takeBack(home_, folder_, record_, record_.messages);
+    if (undone)
+      record_.verdict = "undone";
+    record_.after = runningInstances(home_);
+    return undone;
+  }
+
+  /// Nothing was changed: the folder goes, and the caller gets the record.
+  Record refused() {
+    place_.remove(id_);
+    record_.verdict = "refused";
+    record_.ended = utcTime(std::time(nullptr));
+    record_.phase = Phase::Closed;
+    return record_;
+  }
+
+  void finish() {
+    record_.ended = utcTime(std::time(nullptr));
+    record_.phase = Phase::Closed;
+    writeRecord(folder_, record_);
+    removePatches(folder_ + "/patches");
+    place_.keepNewest(options_.keep);
+  }
+
+  const Home &home_;
+  const ApplyOptions &options_;
+  const ApplyDialogue &dialogue_;
+  TransactionPlace place_;
+  std::string id_;
+  std::string folder_;
+  std::string taken_; ///< the patches where others cannot change them
+  bool hasCommands_ = false;
+  HomeChanges changes_;
+  Record record_;
+};
+
+} // namespace
+
+Record applyPatches(const Home &home, const std::string &path, const ApplyOptions &options,
+                    const ApplyDialogue &dialogue) {
+  const HomeLock lock(home.path());
+  if (!lock.isHeld())
+    throw RefusalError("another transaction is at work on " + home.path());
+  std::vector<std::string> messages;
+  if (!options.dryRun)
+    for (const std::string &id : takeBackInterrupted(home))
+      messages.push_back("the interrupted transaction " + id + " was taken back first");
+  return Transaction(home, options, dialogue, messages).run(path);
+}
+
+int statusOf(const Record &record) {
+  if (record.verdict == "applied")
+    return Good;
+  if (record.verdict == "undone")
+    return record.action == "undo" ? Good : FailedAndUndone;
+  if (record.verdict == "failed")
+    return InstallerFailed;
+  if (record.verdict == "incomplete")
+    return DifferencesFound;
+  return record.dryRun && count(record.findings, Severity::Error) == 0 ? Good : Findings;
+}

@@ -1,0 +1,17 @@
+// What an installation will change, told before it begins: levels, files, directories, files written in
+// place.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "home.h"
+#include "patch.h"
+#include "transaction/record.h"
+
+/// Fills the record's patches, files, rewritten files, directories, left-overs to set aside and the instances
+/// that run now.
+void planInstallation(const Home &home, const std::vector<Patch> &patches, Record &record);
+
+/// Every running instance of the home.
+std::vector<RecordedInstance> runningInstances(const Home &home);

@@ -1,0 +1,182 @@
+#include "transaction/saving.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "filedescriptor.h"
+#include "inputfile.h"
+#include "judgement.h"
+
+namespace {
+
+/// Version files, results and histories are small; none comes near this.
+constexpr std::size_t LargestCopy = 256UL * 1024 * 1024;
+
+std::string savedPath(const std::string &folder, const std::string &name) {
+  return folder + "/before/" + name;
+}
+
+/// A copy with all attributes. cp knows those of every file system.
+void copyWhole(const std::string &from, const std::string &to) {
+  const ChildResult copied = runChild({"cp", "-a", "--", from, to}, {"/usr/bin:/bin", {"LC_ALL=C"}});
+  if (copied.status != 0)
+    throw RefusalError("cannot save " + from + ": " + copied.err);
+}
+
+/// A second name for the file itself, a symbolic link included; a copy where the system gives none.
+void saveByLink(const std::string &from, const std::string &to) {
+  if (linkat(AT_FDCWD, from.c_str(), AT_FDCWD, to.c_str(), 0) == 0 || errno == EEXIST)
+    return;
+  if (errno != EXDEV && errno != EPERM && errno != EMLINK && errno != EOPNOTSUPP)
+    throw RefusalError("cannot save " + from + ": " + strerror(errno));
+  copyWhole(from, to);
+}
+
+void syncSystem(const std::string &path) {
+  const FileDescriptor directory(path.c_str(), O_RDONLY | O_DIRECTORY);
+  if (directory.isOpen())
+    static_cast<void>(syncfs(directory.get()));
+}
+
+/// Puts one old file back in place of the new one, atomically. Both may be names of one file, which rename
+/// leaves alone.
+void putBack(const std::string &saved, const std::string &target) {
+  const std::optional<FileState> old = stateOf(saved);
+  if (!old)
+    return; // put back by an undo before this one
+  const std::optional<FileState> now = stateOf(target);
+  const bool isThere = now && now->device == old->device && now->inode == old->inode;
+  const int result = isThere ? unlink(saved.c_str()) : rename(saved.c_str(), target.c_str());
+  if (result == 0)
+    return;
+  if (errno != EXDEV)
+    throw JudgementError("cannot put " + target + " back: " + strerror(errno));
+  // It was copied, because it is on another file system: copied back beside it, then renamed.
+  const std::string beside = target + ".orvpatchctl";
+  copyWhole(saved, beside);
+  if (rename(beside.c_str(), target.c_str()) != 0)
+    throw JudgementError("cannot put " + target + " back: " + strerror(errno));
+  static_cast<void>(unlink(saved.c_str()));
+}
+
+/// Whether what stands at the path now was not put there by the installation that the record tells of. Of a
+/// run that was interrupted only the new files are known, by what they are not.
+bool isChangedSince(const TouchedFile &file, const FileState &now) {
+  return file.after && !isSameFile(*file.after, now);
+}
+
+void restoreFile(const std::string &home, const std::string &folder, const TouchedFile &file,
+                 std::vector<std::string> &messages) {
+  const std::string target = home + file.path;
+  const std::optional<FileState> now = stateOf(target);
+  const bool isOld =
+      now && file.before && now->device == file.before->device && now->inode == file.before->inode;
+  if (now && !isOld && isChangedSince(file, *now)) {
+    messages.push_back(file.path + ": changed since the installation, left as it is");
+    return;
+  }
+  if (file.before)
+    return putBack(savedPath(folder, file.saved), target);
+  if (now && unlink(target.c_str()) != 0)
+    messages.push_back(file.path + ": cannot be removed: " + strerror(errno));
+}
+
+/// Writes the old content into the file, so that its inode, names and attributes stay, and sets its times
+/// back.
+void restoreInPlace(const std::string &saved, const std::string &target, const FileState &before) {
+  const std::string content = InputFile(saved).content(LargestCopy);
+  FileDescriptor file(target.c_str(), O_WRONLY | O_CREAT | O_NOFOLLOW);
+  const timespec times[2] = {{0, UTIME_OMIT},
+                             {static_cast<time_t>(before.seconds), static_cast<long>(before.nanoseconds)}};
+  if (!file.isOpen() || !file.write(content) ||
+      ftruncate(file.get(), static_cast<off_t>(content.size())) != 0 || futimens(file.get(), times) != 0 ||
+      fsync(file.get()) != 0)
+    throw JudgementError("cannot write " + target + ": " + strerror(errno));
+}
+
+void restoreRewritten(const std::string &home, const std::string &folder, const RewrittenFile &file,
+                      std::vector<std::string> &messages) {
+  const std::string target = home + file.path;
+  if (file.isEvidence)
+    return;
+  if (!file.before) {
+    if (unlink(target.c_str()) != 0 && errno != ENOENT && errno != ENOTDIR)
+      messages.push_back(file.path + ": cannot be removed: " + strerror(errno));
+    return;
+  }
+  const std::optional<FileState> now = stateOf(target);
+  if (now && isSameFile(*now, *file.before))
+    return;
+  restoreInPlace(savedPath(folder, file.saved), target, *file.before);
+}
+
+std::string asidePath(const std::string &folder, const std::string &directory) {
+  return savedPath(folder, directory.substr(directory.find('/') + 1) + ".tmp");
+}
+
+/// What the installer left in a temporary directory goes; what lay there before comes back.
+void restoreTemporary(const std::string &home, const std::string &folder, const Record &record,
+                      const std::string &directory) {
+  const bool wasThere =
+      std::find(record.setAside.begin(), record.setAside.end(), directory) != record.setAside.end();
+  const std::string saved = asidePath(folder, directory);
+  if (wasThere && !stateOf(saved))
+    return; // not moved yet, or back already
+  static_cast<void>(runChild({"rm", "-rf", "--", home + directory}, {"/usr/bin:/bin", {"LC_ALL=C"}}));
+  if (wasThere && rename(saved.c_str(), (home + directory).c_str()) != 0)
+    throw JudgementError("cannot put " + home + directory + " back: " + strerror(errno));
+}
+
+} // namespace
+
+void saveFiles(const std::string &home, const std::string &folder, Record &record) {
+  for (const TouchedFile &file : record.files)
+    if (file.before)
+      saveByLink(home + file.path, savedPath(folder, file.saved));
+  for (const RewrittenFile &file : record.rewritten)
+    if (file.before)
+      copyWhole(home + file.path, savedPath(folder, file.saved));
+  for (const std::string &directory : record.setAside)
+    if (rename((home + directory).c_str(), asidePath(folder, directory).c_str()) != 0)
+      throw RefusalError("cannot set " + directory + " aside: " + strerror(errno));
+  syncSystem(home);
+}
+
+void noteInstalled(const std::string &home, Record &record) {
+  for (TouchedFile &file : record.files)
+    file.after = stateOf(home + file.path);
+}
+
+void restoreFiles(const std::string &home, const std::string &folder, const Record &record,
+                  std::vector<std::string> &messages) {
+  for (const TouchedFile &file : record.files)
+    restoreFile(home, folder, file, messages);
+  for (const RewrittenFile &file : record.rewritten)
+    restoreRewritten(home, folder, file, messages);
+  for (const std::string &directory : record.temporary)
+    restoreTemporary(home, folder, record, directory);
+  // Those that hold something else by now stay; that is no error.
+  for (auto directory = record.directories.rbegin(); directory != record.directories.rend(); ++directory)
+    if (rmdir((home + directory->path).c_str()) != 0 && errno == ENOTEMPTY)
+      messages.push_back(directory->path + ": not empty, left as it is");
+  syncSystem(home);
+}
+
+void closeDirectories(const std::string &home, const Record &record) {
+  for (const NewDirectory &made : record.directories) {
+    const std::size_t slash = made.path.rfind('/');
+    const std::string parent = home + (slash == std::string::npos ? "" : made.path.substr(0, slash));
+    const FileDescriptor directory((home + made.path).c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW);
+    struct stat status = {};
+    if (!directory.isOpen() || stat(parent.c_str(), &status) != 0)
+      continue;
+    // An ordinary user can give neither owner nor a foreign group: the mode is set all the same.
+    static_cast<void>(!fchown(directory.get(), status.st_uid, status.st_gid));
+    static_cast<void>(!fchmod(directory.get(), status.st_mode & 07777));
+  }
+}
