@@ -15,11 +15,15 @@ _orvpatchctl() {
       _orvpatchctl_offer -d "$word"
       return
       ;;
+    --keyring | --installer)
+      _orvpatchctl_offer -f "$word"
+      return
+      ;;
     --color)
       mapfile -t COMPREPLY < <(compgen -W 'auto always never' -- "$word")
       return
       ;;
-    --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since)
+    --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since | --path | --keep)
       :
       return
       ;;
@@ -27,7 +31,7 @@ _orvpatchctl() {
   # The command, and the number of its arguments before the cursor.
   for ((place = 1; place < COMP_CWORD; place++)); do
     case ${COMP_WORDS[place]} in
-      --output | --color | --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since) ((place++)) ;;
+      --output | --keyring | --installer | --color | --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since | --path | --keep) ((place++)) ;;
       -*) ;;
       *) if [[ -z $command ]]; then command=${COMP_WORDS[place]}; else ((count++)); fi ;;
     esac
@@ -69,11 +73,23 @@ _orvpatchctl() {
       options='--help --json --color --errors --steps --follow'
       kinds=(d -)
       ;;
+    check)
+      options='--help --json --color --no-report --keyring --installer --path'
+      kinds=(d f)
+      ;;
+    apply)
+      options='--help --json --color --yes --dry-run --undo-on-failure --keep --keyring --installer --path'
+      kinds=(d f)
+      ;;
+    undo)
+      options='--help --json --color'
+      kinds=(d -)
+      ;;
   esac
   if [[ $word == -* ]]; then
     mapfile -t COMPREPLY < <(compgen -W "$options" -- "$word")
   elif [[ -z $command ]]; then
-    mapfile -t COMPREPLY < <(compgen -W 'new build lint show status history verify log' -- "$word")
+    mapfile -t COMPREPLY < <(compgen -W 'new build lint show status history verify log check apply undo' -- "$word")
   elif [[ ${kinds[count]:--} != - ]]; then
     _orvpatchctl_offer "-${kinds[count]}" "$word"
   fi

@@ -24,6 +24,9 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   addVerify(*application, invocation);
   addLog(*application, invocation);
   addCompletion(*application, invocation);
+  addCheck(*application, invocation);
+  addApply(*application, invocation);
+  addUndo(*application, invocation);
   return application;
 }
 
@@ -41,6 +44,9 @@ int parseAndRun(int argc, const char *const *argv) {
   } catch (const JudgementError &error) {
     fprintf(stderr, "orvpatchctl: %s\n", error.what());
     return CannotJudge;
+  } catch (const RefusalError &error) {
+    fprintf(stderr, "orvpatchctl: %s\n", error.what());
+    return Findings;
   } catch (const std::bad_alloc &) {
     fputs("orvpatchctl: out of memory\n", stderr);
     return CannotJudge;

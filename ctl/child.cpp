@@ -8,12 +8,13 @@
 
 #include <fcntl.h>
 #include <spawn.h>
-#include <sys/mman.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include "filedescriptor.h"
 #include "judgement.h"
+#include "memoryfile.h"
 #include "utilities.h"
 
 namespace {
@@ -21,7 +22,7 @@ namespace {
 /// A file in memory that a child writes to.
 class Capture {
 public:
-  Capture() : fd_(memfd_create("output", MFD_CLOEXEC)) {
+  Capture() : fd_(memoryFile("output")) {
     if (fd_ < 0)
       throw JudgementError(std::string("no memory for the output of a program: ") + strerror(errno));
   }
@@ -61,13 +62,11 @@ std::vector<char *> pointers(std::vector<std::string> &texts) {
 /// What the child's descriptors and signals are: set up before, released after the start.
 class SpawnSetup {
 public:
-  SpawnSetup(const Capture &out, const Capture &err, const std::string &directory) {
+  SpawnSetup(int out, int err, bool ownSession) {
     posix_spawn_file_actions_init(&files_);
     posix_spawn_file_actions_addopen(&files_, STDIN_FILENO, "/dev/null", O_RDONLY, 0);
-    posix_spawn_file_actions_adddup2(&files_, out.fd(), STDOUT_FILENO);
-    posix_spawn_file_actions_adddup2(&files_, err.fd(), STDERR_FILENO);
-    if (!directory.empty())
-      posix_spawn_file_actions_addchdir_np(&files_, directory.c_str());
+    posix_spawn_file_actions_adddup2(&files_, out, STDOUT_FILENO);
+    posix_spawn_file_actions_adddup2(&files_, err, STDERR_FILENO);
     sigset_t all;
     sigset_t none;
     sigfillset(&all);
@@ -75,7 +74,8 @@ public:
     posix_spawnattr_init(&attributes_);
     posix_spawnattr_setsigdefault(&attributes_, &all);
     posix_spawnattr_setsigmask(&attributes_, &none);
-    posix_spawnattr_setflags(&attributes_, POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK);
+    const int flags = POSIX_SPAWN_SETSIGDEF | POSIX_SPAWN_SETSIGMASK | (ownSession ? POSIX_SPAWN_SETSID : 0);
+    posix_spawnattr_setflags(&attributes_, static_cast<short>(flags));
   }
   SpawnSetup(const SpawnSetup &) = delete;
   SpawnSetup &operator=(const SpawnSetup &) = delete;
@@ -92,8 +92,20 @@ private:
   posix_spawnattr_t attributes_ = {};
 };
 
+int exitStatus(int status) {
+  return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+}
+
+int statusOf(pid_t child) {
+  int status = 0;
+  while (waitpid(child, &status, 0) < 0)
+    if (errno != EINTR)
+      return 127;
+  return exitStatus(status);
+}
+
 /// Waits for the end, without taking the status; false when the time is over before.
-bool hasEnded(pid_t child, std::chrono::seconds limit) {
+bool endsWithin(pid_t child, std::chrono::seconds limit) {
   const auto end = std::chrono::steady_clock::now() + limit;
   auto pause = std::chrono::microseconds(200);
   siginfo_t info = {};
@@ -107,12 +119,23 @@ bool hasEnded(pid_t child, std::chrono::seconds limit) {
   return true;
 }
 
-int statusOf(pid_t child) {
-  int status = 0;
-  while (waitpid(child, &status, 0) < 0)
-    if (errno != EINTR)
-      return 127;
-  return WIFEXITED(status) ? WEXITSTATUS(status) : 128 + WTERMSIG(status);
+/// 0, or why the program was not started.
+int start(const std::string &program, const std::vector<std::string> &words,
+          const ChildEnvironment &environment, const SpawnSetup &setup, pid_t &child) {
+  std::vector<std::string> arguments = words;
+  std::vector<std::string> variables = environment.variables;
+  variables.push_back("PATH=" + environment.path);
+  return posix_spawn(&child, program.c_str(), setup.files(), setup.attributes(), pointers(arguments).data(),
+                     pointers(variables).data());
+}
+
+/// The command as a shell's that changes the directory first: the C libraries of older systems cannot start a
+/// program elsewhere.
+std::vector<std::string> inDirectory(const std::string &directory, const std::string &program,
+                                     const std::vector<std::string> &words) {
+  std::vector<std::string> command = {"sh", "-c", "cd -- \"$0\" && exec \"$@\"", directory, program};
+  command.insert(command.end(), words.begin() + 1, words.end());
+  return command;
 }
 
 } // namespace
@@ -123,22 +146,49 @@ ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironme
     return {127, "", words.front() + ": not found\n", true};
   const Capture out;
   const Capture err;
-  const SpawnSetup setup(out, err, environment.directory);
-  std::vector<std::string> arguments = words;
-  std::vector<std::string> variables = environment.variables;
-  variables.push_back("PATH=" + environment.path);
+  const SpawnSetup setup(out.fd(), err.fd(), false);
   pid_t child = 0;
-  const int error = posix_spawn(&child, program.c_str(), setup.files(), setup.attributes(),
-                                pointers(arguments).data(), pointers(variables).data());
+  const int error =
+      environment.directory.empty()
+          ? start(program, words, environment, setup, child)
+          : start("/bin/sh", inDirectory(environment.directory, program, words), environment, setup, child);
   if (error == EAGAIN || error == ENOMEM)
     throw JudgementError("cannot run " + program + ": " + strerror(error));
   if (error != 0)
     return {127, "", program + ": " + strerror(error) + "\n", true};
-  const bool isInTime = environment.limit.count() == 0 || hasEnded(child, environment.limit);
+  const bool isInTime = environment.limit.count() == 0 || endsWithin(child, environment.limit);
   if (!isInTime)
     kill(child, SIGKILL);
   const int status = statusOf(child);
   return {status, out.text(), err.text(), isInTime};
+}
+
+BackgroundChild::BackgroundChild(const std::vector<std::string> &words, const ChildEnvironment &environment,
+                                 const std::string &outFile, const std::string &errFile) {
+  const FileDescriptor out(outFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW);
+  const FileDescriptor err(errFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW);
+  if (!out.isOpen() || !err.isOpen())
+    throw JudgementError("cannot write " + outFile + ": " + strerror(errno));
+  const SpawnSetup setup(out.get(), err.get(), true);
+  const int error = start(words.front(), words, environment, setup, child_);
+  if (error != 0)
+    throw JudgementError("cannot run " + words.front() + ": " + strerror(error));
+}
+
+bool BackgroundChild::hasEnded(int milliseconds) {
+  for (int waited = 0; child_ != 0; waited += 10) {
+    int status = 0;
+    const pid_t ended = waitpid(child_, &status, WNOHANG);
+    if (ended != 0) {
+      status_ = ended < 0 ? 127 : exitStatus(status);
+      child_ = 0;
+    } else if (waited >= milliseconds) {
+      return false;
+    } else {
+      usleep(10000);
+    }
+  }
+  return true;
 }
 
 std::string findProgram(const std::string &name, const std::string &path) {

@@ -5,6 +5,8 @@
 #include <string>
 #include <vector>
 
+#include <sys/types.h>
+
 struct ChildResult {
   int status =
       0; ///< exit status; 128 and the number of the signal that ended it; 127 when it could not be started
@@ -25,6 +27,25 @@ struct ChildEnvironment {
 /// input, and waits for its end. Output goes to files in memory, so that no child waits for a reader.
 /// JudgementError when the system gives no process.
 ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironment &environment);
+
+/// A program in a session of its own, so that a hang-up of the terminal does not end it. What it says goes to
+/// files.
+class BackgroundChild {
+public:
+  /// Starts it as runChild does; `outFile` and `errFile` are made anew, mode 0600. JudgementError when that
+  /// fails.
+  BackgroundChild(const std::vector<std::string> &words, const ChildEnvironment &environment,
+                  const std::string &outFile, const std::string &errFile);
+
+  /// Whether it has ended; waits at most so long.
+  bool hasEnded(int milliseconds);
+  /// Exit status, as in ChildResult, once it has ended.
+  int status() const { return status_; }
+
+private:
+  pid_t child_ = 0;
+  int status_ = 0;
+};
 
 /// The file that a name stands for in a search path: the first that can be executed; empty when there is
 /// none.

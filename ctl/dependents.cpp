@@ -10,18 +10,6 @@ bool stopsInstances(const Patch &patch) {
   return target == "vema" || target == "vecm" || product == "kqa" || product == "kpt";
 }
 
-/// The kind under which the installer looks a listed product up.
-ORVComponent::Type kindOf(const std::string &code) {
-  if (code == "kqa")
-    return ORVComponent::TYPE_VEMS;
-  return code == "kpt" ? ORVComponent::TYPE_VEPS : ORVComponent::TYPE_AGENT;
-}
-
-bool isLeftRunning(const std::string &code, const std::string &instance) {
-  return code == "kwn" &&
-         (instance.find("kwnsnetd_") != std::string::npos || instance.find("kwnstrap_") != std::string::npos);
-}
-
 } // namespace
 
 std::vector<DependentInstance> dependentInstances(const Patch &patch,
@@ -34,11 +22,22 @@ std::vector<DependentInstance> dependentInstances(const Patch &patch,
   const bool all = codes.front() == "all";
   for (const InstalledComponent &component : components) {
     const bool isMeant = all ? component.type == ORVComponent::TYPE_AGENT
-                             : component.type == kindOf(component.code) &&
+                             : component.type == controlKind(component.code) &&
                                    std::find(codes.begin(), codes.end(), component.code) != codes.end();
     for (const RunningInstance &instance : component.instances)
       if (isMeant && !isLeftRunning(component.code, instance.name))
         found.push_back({component.code, instance});
   }
   return found;
+}
+
+ORVComponent::Type controlKind(const std::string &code) {
+  if (code == "kqa")
+    return ORVComponent::TYPE_VEMS;
+  return code == "kpt" ? ORVComponent::TYPE_VEPS : ORVComponent::TYPE_AGENT;
+}
+
+bool isLeftRunning(const std::string &code, const std::string &instance) {
+  return code == "kwn" &&
+         (instance.find("kwnsnetd_") != std::string::npos || instance.find("kwnstrap_") != std::string::npos);
 }

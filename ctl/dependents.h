@@ -16,3 +16,10 @@ struct DependentInstance {
 /// universal agent that the installer leaves running are not among them.
 std::vector<DependentInstance> dependentInstances(const Patch &patch,
                                                   const std::vector<InstalledComponent> &components);
+
+/// The kind under which the installer looks a product up whose instances it stops or starts.
+ORVComponent::Type controlKind(const std::string &code);
+
+/// Whether the installer leaves an instance alone: two helpers of the universal agent serve its other
+/// instances.
+bool isLeftRunning(const std::string &code, const std::string &instance);

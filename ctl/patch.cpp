@@ -4,11 +4,11 @@
 #include <cerrno>
 #include <cstring>
 
-#include <sys/mman.h>
 #include <unistd.h>
 
 #include "file.h"
 #include "judgement.h"
+#include "memoryfile.h"
 
 namespace {
 
@@ -20,7 +20,7 @@ constexpr const char *targetOrder[] = {"vecm", "vems", "veps", "vepd", "vema"};
 /// A file without a name, in memory alone, with a path under which it can be read.
 class MemoryFile {
 public:
-  explicit MemoryFile(const std::string &content) : fd_(memfd_create("patch.ini", MFD_CLOEXEC)) {
+  explicit MemoryFile(const std::string &content) : fd_(memoryFile("patch.ini")) {
     if (fd_ < 0 || ::write(fd_, content.data(), content.size()) != static_cast<ssize_t>(content.size())) {
       const int error = errno;
       close(fd_);

@@ -53,6 +53,22 @@ std::string jsonText(std::string_view bytes) {
   return escaped(bytes, false);
 }
 
+std::string bytesOfJsonText(std::string_view text) {
+  const auto digit = [](char c) { return static_cast<unsigned>(c <= '9' ? c - '0' : c - 'A' + 10); };
+  std::string bytes;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (text[i] != '\\' || i + 1 == text.size()) {
+      bytes += text[i];
+    } else if (text[i + 1] == 'x' && i + 3 < text.size()) {
+      bytes += static_cast<char>(digit(text[i + 2]) * 16 + digit(text[i + 3]));
+      i += 3;
+    } else {
+      bytes += text[++i];
+    }
+  }
+  return bytes;
+}
+
 std::string terminalText(std::string_view bytes) {
   return escaped(bytes, true);
 }

@@ -9,6 +9,9 @@
 /// For a JSON string: bytes that are no UTF-8 are written \xHH, a backslash as two. Valid UTF-8 stays.
 std::string jsonText(std::string_view bytes);
 
+/// The bytes that jsonText was given.
+std::string bytesOfJsonText(std::string_view text);
+
 /// For a terminal: the same, and control characters are written \xHH too, so that no name moves the cursor.
 std::string terminalText(std::string_view bytes);
 

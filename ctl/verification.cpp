@@ -15,6 +15,7 @@
 #include "filedescriptor.h"
 #include "history.h"
 #include "judgement.h"
+#include "packages.h"
 #include "patchprocessor/patchprocessor.h"
 #include "text.h"
 #include "updatedfiles.h"
@@ -231,6 +232,9 @@ void verifyFiles(const std::string &home, const Patch &patch, std::set<std::stri
                  Verification &verification) {
   if (!patch.archiveProblem.empty())
     throw JudgementError(patch.file + ": " + patch.archiveProblem);
+  // One that was cut between two members reads well to its end.
+  if (!patch.hasEndMark)
+    throw JudgementError(patch.file + ": the archive is incomplete: it has no end mark");
   Verification found;
   Comparison(home, patch, found).run(covered);
   std::sort(found.differences.begin(), found.differences.end(),
@@ -274,6 +278,22 @@ void verifyHistory(const std::string &home, const Patch &patch, Verification &ve
     verification.add(file, "history", "no line for " + name);
   else if (last->result != "PASS")
     verification.add(file, "history", "the last line for " + name + " says " + last->result);
+}
+
+Verification verifyPatches(const Home &home, const std::vector<Patch> &patches) {
+  std::vector<Verification> found(patches.size());
+  std::set<std::string> covered;
+  std::set<std::string> versionFiles;
+  for (std::size_t i = patches.size(); i-- > 0;) {
+    verifyFiles(home.path(), patches[i], covered, found[i]);
+    if (versionFiles.insert(versionFileOf(home, patches[i])).second)
+      verifyLevel(home.path(), patches[i], found[i]);
+    verifyHistory(home.path(), patches[i], found[i]);
+  }
+  Verification all;
+  for (const Verification &one : found)
+    all.append(one);
+  return all;
 }
 
 nlohmann::ordered_json toJson(const Verification &verification) {

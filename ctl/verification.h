@@ -12,6 +12,7 @@
 
 #include <nlohmann/json_fwd.hpp>
 
+#include "home.h"
 #include "patch.h"
 
 struct Difference {
@@ -44,6 +45,9 @@ void verifyLevel(const std::string &home, const Patch &patch, Verification &veri
 
 /// Asks the last history line of this patch (product, platform, target and name) for its result.
 void verifyHistory(const std::string &home, const Patch &patch, Verification &verification);
+
+/// All of it for patches in the installer's order: the last patch of a path or of a version file decides.
+Verification verifyPatches(const Home &home, const std::vector<Patch> &patches);
 
 /// {"differences": [...], "files": N}
 nlohmann::ordered_json toJson(const Verification &verification);

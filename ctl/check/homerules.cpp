@@ -134,9 +134,7 @@ void checkRegistryWriters(HostCheck &check) {
 void checkOtherRuns(HostCheck &check) {
   for (const std::string &run : installerRuns(check.home))
     check.add("other-run", "", "", run);
-  if (check.has("other-run"))
-    return;
-  if (isHomeLocked(check.home))
+  if (!check.isLockHeld && !check.has("other-run") && isHomeLocked(check.home))
     check.add("other-run", "", "", "a transaction of orvpatchctl holds the home");
 }
 

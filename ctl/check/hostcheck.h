@@ -17,6 +17,7 @@ public:
   std::string keyring;            ///< empty: signatures are not asked for
   std::vector<Patch> patches;     ///< those that apply, in the installer's order
   std::vector<std::string> files; ///< the path of every patch file that was given, applicable or not
+  bool isLockHeld = false;        ///< by this process itself
 
   /// Adds a finding of a rule of the table, with the rule's severity and remedy.
   void add(const std::string &rule, const std::string &patch, const std::string &where,

@@ -32,8 +32,9 @@ HostCheck subjectOf(const Home &home, const std::string &path, const CheckOption
   check.home = home.path();
   check.searchPath = options.installer.searchPath;
   check.keyring = options.keyring;
-  check.files = patchFiles(path);
-  for (const std::string &file : check.files) {
+  check.isLockHeld = options.isLockHeld;
+  check.files = patchFiles(options.original.empty() ? path : options.original);
+  for (const std::string &file : patchFiles(path)) {
     if (!DCFPackageProcessor::isApplicable(home.path(), File(file)))
       continue;
     Patch patch = readPatch(file);
@@ -46,6 +47,15 @@ HostCheck subjectOf(const Home &home, const std::string &path, const CheckOption
 std::string trimmed(std::string text) {
   Util::trimString(text);
   return text;
+}
+
+/// A report that ends with an error leaves what it has extracted. None of it was there before: a left-over
+/// keeps the report from being run.
+void removeExtracted(const HostCheck &check) {
+  for (const std::string &code : check.temporaryCodes())
+    if (!code.empty() && code != "." && code != ".." && code.find('/') == std::string::npos)
+      static_cast<void>(
+          runChild({"rm", "-rf", "--", check.home + "tmp/" + code}, {"/usr/bin:/bin", {"LC_ALL=C"}}));
 }
 
 } // namespace
@@ -61,6 +71,7 @@ CheckResult checkInstallation(const Home &home, const std::string &path, const C
   checkSignatures(check);
   if (options.withReport && !wouldHarm(check.findings()) && !wouldHarm(result.findings)) {
     result.report = runReport(options.installer, home.path(), path);
+    removeExtracted(check);
     if (result.report->status != 0)
       check.add("installer-refuses", "", "status " + std::to_string(result.report->status),
                 trimmed(result.report->err));

@@ -13,6 +13,8 @@ struct CheckOptions {
   InstallerOptions installer;
   std::string keyring; ///< empty: signatures are not asked for
   bool withReport = true;
+  std::string original;    ///< where the patches were before they were copied; empty: where they are
+  bool isLockHeld = false; ///< by this process itself
 };
 
 struct CheckResult {

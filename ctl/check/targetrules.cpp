@@ -76,11 +76,12 @@ std::string nearestExisting(const std::string &home, std::string directory) {
 class LinkProbe {
 public:
   explicit LinkProbe(const std::string &home) : home_(home) {
-    const std::string name = ".orvpatchctl-probe-" + std::to_string(getpid());
+    const std::string name = ".orvpatchctl-probe-source";
     struct stat status = {};
     const bool hasTmp = stat((home + "tmp").c_str(), &status) == 0 && S_ISDIR(status.st_mode);
     source_ = home + (hasTmp ? "tmp/" : "") + name;
-    target_ = name + ".link";
+    target_ = ".orvpatchctl-probe";
+    removeStale(source_);
     const FileDescriptor file(source_.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW);
     error_ = file.isOpen() ? 0 : errno;
   }
@@ -96,12 +97,21 @@ public:
     if (error_ != 0)
       return error_;
     const std::string target = home_ + directory + (directory.empty() ? "" : "/") + target_;
+    removeStale(target);
     if (link(source_.c_str(), target.c_str()) != 0)
       return errno;
     return unlink(target.c_str()) == 0 ? 0 : errno;
   }
 
 private:
+  /// A kill between the two calls leaves an empty file, which the next check finds under the same name.
+  static void removeStale(const std::string &target) {
+    struct stat status = {};
+    if (lstat(target.c_str(), &status) == 0 && S_ISREG(status.st_mode) && status.st_size == 0 &&
+        status.st_uid == geteuid())
+      static_cast<void>(unlink(target.c_str()));
+  }
+
   std::string home_;
   std::string source_;
   std::string target_;

@@ -15,3 +15,6 @@ void addHistory(CLI::App &application, Invocation &invocation);
 void addVerify(CLI::App &application, Invocation &invocation);
 void addLog(CLI::App &application, Invocation &invocation);
 void addCompletion(CLI::App &application, Invocation &invocation);
+void addCheck(CLI::App &application, Invocation &invocation);
+void addApply(CLI::App &application, Invocation &invocation);
+void addUndo(CLI::App &application, Invocation &invocation);

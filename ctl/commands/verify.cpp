@@ -13,25 +13,6 @@
 
 namespace {
 
-/// What stands below one patch file or a directory of them: the last patch of a path or of a version file
-/// decides.
-Verification verifyPatches(const Home &home, const std::string &path) {
-  const std::vector<Patch> patches = applicablePatches(home, path);
-  std::vector<Verification> found(patches.size());
-  std::set<std::string> covered;
-  std::set<std::string> versionFiles;
-  for (std::size_t i = patches.size(); i-- > 0;) {
-    verifyFiles(home.path(), patches[i], covered, found[i]);
-    if (versionFiles.insert(versionFileOf(home, patches[i])).second)
-      verifyLevel(home.path(), patches[i], found[i]);
-    verifyHistory(home.path(), patches[i], found[i]);
-  }
-  Verification all;
-  for (const Verification &one : found)
-    all.append(one);
-  return all;
-}
-
 void print(const Verification &verification, const OutputOptions &options) {
   const Palette palette(options);
   for (const Difference &difference : verification.differences)
@@ -43,7 +24,7 @@ void print(const Verification &verification, const OutputOptions &options) {
 
 void verify(const std::string &homePath, const std::string &path, Invocation &invocation) {
   const Home home(homePath);
-  const Verification verification = verifyPatches(home, path);
+  const Verification verification = verifyPatches(home, applicablePatches(home, path));
   if (invocation.output.json)
     printDocument(toJson(verification));
   else

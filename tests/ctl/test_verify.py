@@ -87,6 +87,18 @@ def test_an_archive_cut_between_members_names_every_file_that_is_missing(ctl, ho
     assert [kind for _, kind in found if kind in ("level", "history")] == ([] if cut else ["level", "history"])
 
 
+def test_a_cut_archive_itself_cannot_be_judged(ctl, home, install, write):
+    home.component("yn")
+    path = write(patch_of_five())
+    with tarfile.open(path) as archive:
+        boundary = archive.getmembers()[-1].offset
+    path.write_bytes(path.read_bytes()[:boundary])
+    install(path)
+    result = ctl.run("verify", home, path, "--json")
+    assert (result.status, result.out) == (2, b"")
+    assert b"incomplete" in result.err
+
+
 def test_a_tar_that_is_killed_half_way_is_found(ctl, home, install, write, scratch):
     """A child that a signal ends counts as a success."""
     home.component("yn")

@@ -22,6 +22,14 @@ TEST(CtlText, BackslashIsDoubled) {
   EXPECT_EQ(jsonText("a\\xFF"), "a\\\\xFF");
 }
 
+TEST(CtlText, EveryByteComesBack) {
+  std::string bytes;
+  for (int byte = 0; byte < 256; ++byte)
+    bytes += static_cast<char>(byte);
+  bytes += "\xC3\xA9\\x41\\";
+  EXPECT_EQ(bytesOfJsonText(jsonText(bytes)), bytes);
+}
+
 TEST(CtlText, TerminalTextHasNoControlCharacters) {
   EXPECT_EQ(terminalText("a\x1b[31m\n\x7f"), "a\\x1B[31m\\x0A\\x7F");
   EXPECT_EQ(jsonText("\t"), "\t");
