@@ -6,7 +6,6 @@ A rotating sample in every run; ORVPATCH_FAULTS=all kills before each call. ORVP
 import os
 import random
 import re
-import subprocess
 import time
 from collections import Counter
 
