@@ -14,6 +14,7 @@
 #include "text.h"
 #include "transaction/changes.h"
 #include "transaction/instances.h"
+#include "transaction/page.h"
 #include "transaction/place.h"
 #include "transaction/plan.h"
 #include "transaction/saving.h"
@@ -183,6 +184,7 @@ private:
   void finish() {
     record_.ended = utcTime(std::time(nullptr));
     record_.phase = Phase::Closed;
+    writePage(folder_, record_);
     writeRecord(folder_, record_);
     removePatches(folder_ + "/patches");
     place_.keepNewest(options_.keep);

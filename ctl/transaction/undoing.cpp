@@ -9,6 +9,7 @@
 #include "processes.h"
 #include "text.h"
 #include "transaction/instances.h"
+#include "transaction/page.h"
 #include "transaction/place.h"
 #include "transaction/plan.h"
 #include "transaction/saving.h"
@@ -103,6 +104,7 @@ void markUndone(const TransactionPlace &place, Record record, const std::vector<
   record.messages.insert(record.messages.end(), messages.begin(), messages.end());
   if (record.ended.empty())
     record.ended = utcTime(std::time(nullptr));
+  writePage(place.folderOf(record.id), record);
   writeRecord(place.folderOf(record.id), record);
 }
 
@@ -152,6 +154,7 @@ Record undoTransaction(const Home &home, const std::string &id) {
   record.verdict = whole ? "undone" : "incomplete";
   record.ended = utcTime(std::time(nullptr));
   record.phase = Phase::Closed;
+  writePage(folder, record);
   writeRecord(folder, record);
   // One that was taken back only in part may be undone again, once what stood in the way is gone.
   if (whole)
