@@ -11,6 +11,7 @@
 #include "commands/commands.h"
 #include "text.h"
 #include "transaction/applying.h"
+#include "transaction/progress.h"
 #include "transaction/summary.h"
 
 namespace {
@@ -52,13 +53,23 @@ void apply(const Arguments &arguments, Invocation &invocation) {
   options.check.installer.file = findInstaller(options.check.installer);
   renewEnvironment(options.check.installer);
   const Home home(*arguments.home);
+  Progress progress(home.path(), stderr, isatty(STDERR_FILENO) == 1);
   const bool isQuiet = invocation.output.json;
-  const ApplyDialogue dialogue = {[&arguments](const Record &record) { return agrees(arguments, record); },
-                                  [isQuiet](const std::string &step) {
-                                    if (!step.empty() && !isQuiet)
-                                      fprintf(stderr, "%s\n", step.c_str());
+  const ApplyDialogue dialogue = {[&arguments, &progress](const Record &record) {
+                                    progress.end(); // the question has a line of its own
+                                    progress.expect(record.files.size());
+                                    return agrees(arguments, record);
+                                  },
+                                  [isQuiet, &progress](const std::string &step) {
+                                    if (isQuiet)
+                                      return;
+                                    if (step.empty())
+                                      progress.poll();
+                                    else
+                                      progress.begin(step);
                                   }};
   const Record record = applyPatches(home, arguments.patch, options, dialogue);
+  progress.end();
   if (invocation.output.json)
     printDocument(toJson(record));
   else

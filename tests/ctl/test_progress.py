@@ -1,0 +1,108 @@
+"""What apply shows while it is at work: one line that is written over on a terminal, elsewhere a line a step."""
+
+import os
+import pty
+import re
+import select
+import struct
+import subprocess
+import tempfile
+import termios
+import time
+from fcntl import ioctl
+
+import pytest
+
+from support import Patch
+
+STEPS = ["take", "check", "save", "install", "verify", "start", "directories"]
+FILES = 400
+
+
+@pytest.fixture(name="ready")
+def ready_fixture(home):
+    home.component("yn")
+    (home.path / "tmp").chmod(0o700)
+    return home
+
+
+@pytest.fixture(name="large")
+def large_fixture(write):
+    patch = Patch("yn").script("slow.sh", when="post", body="sleep 1")
+    for number in range(FILES):
+        patch.file(f"lib/file{number:04}", "new\n")
+    return write(patch)
+
+
+def on_terminal(ctl, *words, columns=100):
+    """Runs it on a terminal of its own; (seconds since the start, bytes) of each piece that it showed."""
+    ours, theirs = pty.openpty()
+    ioctl(theirs, termios.TIOCSWINSZ, struct.pack("HHHH", 24, columns, 0, 0))
+    began = time.monotonic()
+    with tempfile.TemporaryFile() as printed, \
+            subprocess.Popen([*ctl.program.argv, *map(os.fspath, words)], stdin=subprocess.DEVNULL,
+                             stdout=printed, stderr=theirs) as process:
+        os.close(theirs)
+        shown = []
+        while True:
+            select.select([ours], [], [], 120)
+            try:
+                data = os.read(ours, 65536)
+            except OSError:  # the terminal was closed by its last process
+                break
+            if not data:
+                break
+            shown.append((time.monotonic() - began, data))
+        status = process.wait(120)
+        printed.seek(0)
+        out = printed.read()
+    os.close(ours)
+    return status, shown, out
+
+
+def lines_of(shown):
+    return [line.rstrip() for line in b"".join(data for _, data in shown).decode().split("\r") if line.strip()]
+
+
+def test_one_line_on_a_terminal(ctl, ready, large):
+    status, shown, out = on_terminal(ctl, "apply", ready, large, "--yes")
+    assert status == 0 and b"\napplied\n" in out
+    text = b"".join(data for _, data in shown)
+    assert b"\n" not in text and b"\x1b" not in text
+    lines = lines_of(shown)
+    assert list(dict.fromkeys(line.split(":")[0].split(",")[0] for line in lines)) == STEPS
+    counts = [int(found[1]) for found in (re.search(rf"(\d+) of {FILES} files", line) for line in lines) if found]
+    assert counts == sorted(counts) and counts[-1] == FILES
+    assert any(line.startswith("install: runPostScripts") for line in lines)
+    assert text.split(b"\r")[-2:] == [b" " * len(text.split(b"\r")[-2]), b""]  # the line has gone
+
+
+def test_no_line_is_longer_than_the_terminal_is_wide(ctl, ready, large):
+    _, shown, _ = on_terminal(ctl, "apply", ready, large, "--yes", columns=30)
+    assert max(map(len, lines_of(shown))) <= 29
+
+
+def test_a_line_a_step_elsewhere(ctl, ready, large):
+    result = ctl.run("apply", ready, large, "--yes")
+    lines = result.err.decode().splitlines()
+    assert [line for line in lines if ":" not in line] == STEPS
+    assert f"install: {large.name}: moveFiles" in lines
+    inside = [line.rsplit(": ", 1)[1] for line in lines if line.startswith(f"install: {large.name}: ")]
+    begin = inside.index("runPrePatchScripts")
+    assert inside[begin:begin + 4] == ["runPrePatchScripts", "stopDependents", "runPreScripts", "moveFiles"]
+
+
+def test_nothing_beside_a_document(ctl, ready, large):
+    status, shown, out = on_terminal(ctl, "apply", ready, large, "--yes", "--json")
+    assert (status, shown) == (0, []) and out.startswith(b"{")
+
+
+def test_a_log_that_cannot_be_followed_ends_nothing(ctl, program, ready, large, scratch):
+    installer = scratch / "installer"
+    log = ready.path / "patchlogs/orvpatch.log"
+    installer.write_text(f'#!/bin/sh\ncase $3 in -i) rm -f "{log}"; mkdir "{log}"; sleep 1;; esac\n'
+                         f'exec "{program.binary}" "$@"\n')
+    installer.chmod(0o755)
+    result = ctl.run("apply", ready, large, "--yes", "--installer", installer)
+    assert result.status == 0, result
+    assert log.is_dir() and ready.exists(f"lib/file{FILES - 1:04}")
