@@ -85,11 +85,15 @@ _orvpatchctl() {
       options='--help --json --color'
       kinds=(d -)
       ;;
+    recover)
+      options='--help --json --color --fix'
+      kinds=(d)
+      ;;
   esac
   if [[ $word == -* ]]; then
     mapfile -t COMPREPLY < <(compgen -W "$options" -- "$word")
   elif [[ -z $command ]]; then
-    mapfile -t COMPREPLY < <(compgen -W 'new build lint show status history verify log check apply undo' -- "$word")
+    mapfile -t COMPREPLY < <(compgen -W 'new build lint show status history verify log check apply undo recover' -- "$word")
   elif [[ ${kinds[count]:--} != - ]]; then
     _orvpatchctl_offer "-${kinds[count]}" "$word"
   fi

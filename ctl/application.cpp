@@ -27,6 +27,7 @@ std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   addCheck(*application, invocation);
   addApply(*application, invocation);
   addUndo(*application, invocation);
+  addRecover(*application, invocation);
   return application;
 }
 

@@ -18,3 +18,4 @@ void addCompletion(CLI::App &application, Invocation &invocation);
 void addCheck(CLI::App &application, Invocation &invocation);
 void addApply(CLI::App &application, Invocation &invocation);
 void addUndo(CLI::App &application, Invocation &invocation);
+void addRecover(CLI::App &application, Invocation &invocation);

@@ -13,18 +13,6 @@
 
 namespace {
 
-/// The level that a version file has now; empty when it has none.
-std::string levelIn(const std::string &versionFile) {
-  std::vector<std::string> lines;
-  static_cast<void>(Util::readFileByLines(versionFile.c_str(), lines));
-  std::string level;
-  for (const std::string &line : lines)
-    if (line.rfind("VRMF", 0) == 0 && line.find('=') != std::string::npos)
-      level = line.substr(line.find('=') + 1);
-  Util::trimString(level);
-  return level.empty() ? "" : Version(level).getDottedVersionString();
-}
-
 RecordedPatch recordedPatch(const Home &home, const Patch &patch) {
   const PatchDescriptor &descriptor = *patch.descriptor;
   return {patch.file,
@@ -106,6 +94,17 @@ std::vector<RecordedInstance> instancesOf(const std::vector<InstalledComponent> 
 }
 
 } // namespace
+
+std::string levelIn(const std::string &versionFile) {
+  std::vector<std::string> lines;
+  static_cast<void>(Util::readFileByLines(versionFile.c_str(), lines));
+  std::string level;
+  for (const std::string &line : lines)
+    if (line.rfind("VRMF", 0) == 0 && line.find('=') != std::string::npos)
+      level = line.substr(line.find('=') + 1);
+  Util::trimString(level);
+  return level.empty() ? "" : Version(level).getDottedVersionString();
+}
 
 void planInstallation(const Home &home, const std::vector<Patch> &patches, Record &record) {
   Plan plan(home, record);

@@ -15,3 +15,6 @@ void planInstallation(const Home &home, const std::vector<Patch> &patches, Recor
 
 /// Every running instance of the home.
 std::vector<RecordedInstance> runningInstances(const Home &home);
+
+/// The level that a version file has, "06.10.00.02"; empty when it has none.
+std::string levelIn(const std::string &versionFile);

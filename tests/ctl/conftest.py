@@ -28,10 +28,14 @@ class Ctl:
         result = self.run(*words, "--json", **options)
         assert result.status == status, (result.status, result.out, result.err)
         document = json.loads(result.out)
-        schema = SCHEMAS / f"{words[0]}.json"
-        assert schema.exists(), f"no schema for {words[0]}"
-        jsonschema.Draft7Validator(json.loads(schema.read_text())).validate(document)
+        jsonschema.Draft7Validator(self.schema(words[0])).validate(document)
         return document
+
+    @staticmethod
+    def schema(command):
+        schema = SCHEMAS / f"{command}.json"
+        assert schema.exists(), f"no schema for {command}"
+        return json.loads(schema.read_text())
 
 
 @pytest.fixture
