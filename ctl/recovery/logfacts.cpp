@@ -146,7 +146,7 @@ private:
   /// The level that was read is no longer the one that a patch has written.
   void forget(const std::string &patch) {
     const PatchFileName name(patch);
-    const std::string product = name.getProduct();
+    const std::string &product = name.getProduct();
     const std::string code =
         name.getTarget() == "vecm" ? "zt" : product.substr(product.size() < 2 ? 0 : product.size() - 2);
     for (auto version = known_.begin(); version != known_.end();)

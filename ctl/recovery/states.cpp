@@ -199,9 +199,11 @@ private:
 
   void tellEmptyFiles() {
     std::error_code error;
-    for (const fs::directory_entry &entry : fs::directory_iterator(home_.at("registry"), error))
-      if (entry.path().extension() == ".ver" && isEmptyFile("registry/" + entry.path().filename().string()))
-        add("level-empty", "registry/" + entry.path().filename().string());
+    for (const fs::directory_entry &entry : fs::directory_iterator(home_.at("registry"), error)) {
+      const std::string path = entry.path().string().substr(home_.path().size());
+      if (entry.path().extension() == ".ver" && isEmptyFile(path))
+        add("level-empty", path);
+    }
     if (isEmptyFile("vmaorv6/agentdepot/rc.txt"))
       add("result-file-empty", "vmaorv6/agentdepot/rc.txt");
   }
@@ -257,7 +259,8 @@ Attributes attributesFor(const Home &home, const Interruption &found, const Inte
 
 std::string sourceOf(const Home &home, const InterruptedPatch &patch, const std::string &path) {
   for (const std::string &directory : patch.temporary) {
-    const std::string source = home.at(directory + "/updated_files/" + path);
+    std::string source = home.at(directory);
+    source.append("/updated_files/").append(path);
     if (stateOf(source))
       return source;
   }

@@ -43,7 +43,7 @@ std::string withoutDirections(const std::string &text) {
       continue;
     }
     char bytes[16];
-    snprintf(bytes, sizeof bytes, "\\xE2\\x%02X\\x%02X", static_cast<unsigned char>(text[at + 1]),
+    snprintf(bytes, sizeof bytes, R"(\xE2\x%02X\x%02X)", static_cast<unsigned char>(text[at + 1]),
              static_cast<unsigned char>(text[at + 2]));
     result += bytes;
     at += 2;
@@ -104,12 +104,12 @@ std::string counted(std::size_t count, const std::string &what) {
 }
 
 std::string cell(const char *name, const std::string &html) {
-  return std::string("<td data-name=\"") + name + "\">" + html + "</td>";
+  return std::string(R"(<td data-name=")") + name + "\">" + html + "</td>";
 }
 
 /// One that keeps its width beside long names.
 std::string shortCell(const char *name, const std::string &html) {
-  return std::string("<td class=\"short\" data-name=\"") + name + "\">" + html + "</td>";
+  return std::string(R"(<td class="short" data-name=")") + name + "\">" + html + "</td>";
 }
 
 bool endedWell(const Record &record) {
@@ -217,8 +217,8 @@ private:
     for (const RecordedStep &step : record_.steps)
       total += step.seconds;
     heading("Steps");
-    html_ += "<svg role=\"img\" width=\"100%\" height=\"" + std::to_string(RowHeight * record_.steps.size()) +
-             "\" aria-label=\"Timeline of the steps, " + number(total, "%.2f") + " seconds\">\n";
+    html_ += R"(<svg role="img" width="100%" height=")" + std::to_string(RowHeight * record_.steps.size()) +
+             R"(" aria-label="Timeline of the steps, )" + number(total, "%.2f") + " seconds\">\n";
     double start = 0;
     std::size_t top = 0;
     for (const RecordedStep &step : record_.steps) {
@@ -233,14 +233,18 @@ private:
     const double whole = total > 0 ? total : 1;
     const std::string from = number(100 * start / whole, "%.3f%%");
     const std::string mark = number(std::min(100 * start / whole, 99.5), "%.3f%%");
-    const std::string y = "\" y=\"" + std::to_string(top + 20) + "\" height=\"10\" ";
     const char *const kind = step.result == "ok" ? "ok" : "failed";
-    html_ += "<text x=\"0\" y=\"" + std::to_string(top + 15) + "\">" + escaped(step.step) + "  " +
+    html_ += R"(<text x="0" y=")" + std::to_string(top + 15) + "\">" + escaped(step.step) + "  " +
              number(step.seconds, "%.2f s") + (step.result == "ok" ? "" : "  " + escaped(step.result)) +
-             "</text>\n<rect class=\"rail\" x=\"0" + y + "width=\"100%\"/>\n<rect class=\"" + kind +
-             "\" x=\"" + from + y + "width=\"" + number(100 * step.seconds / whole, "%.3f%%") +
-             "\"/>\n<rect class=\"" + kind + "\" x=\"" + from + y +
-             "width=\"2\"/>\n"; // what takes no time is seen too
+             "</text>\n" + rect("rail", "0", "100%", top) +
+             rect(kind, from, number(100 * step.seconds / whole, "%.3f%%"), top) +
+             rect(kind, mark, "2", top); // what takes no time is seen too
+  }
+
+  static std::string rect(const std::string &kind, const std::string &from, const std::string &width,
+                          std::size_t top) {
+    return R"(<rect class=")" + kind + R"(" height="10" x=")" + from + R"(" y=")" + std::to_string(top + 20) +
+           R"(" width=")" + width + "\"/>\n";
   }
 
   void differences() {

@@ -1,6 +1,7 @@
 #include "transaction/progress.h"
 
 #include <algorithm>
+#include <cmath>
 
 #include <sys/ioctl.h>
 
@@ -25,7 +26,7 @@ std::optional<long> secondsLeft(std::size_t done, std::size_t all, double second
   if (done == 0 || seconds < 1)
     return std::nullopt;
   const double rest = all > done ? static_cast<double>(all - done) : 0;
-  return static_cast<long>(seconds * rest / static_cast<double>(done) + 0.5);
+  return std::lround(seconds * rest / static_cast<double>(done));
 }
 
 Progress::Progress(const std::string &home, FILE *stream, bool isLive)
