@@ -193,11 +193,11 @@ def installed(product):
     return len(list((product.path / "bin").glob("[0-9]*")))
 
 
-def test_a_tar_that_warns_of_20_000_members_ends(program, product, patch_dir):
-    if pipe_of_the_own_user() < LARGEST_PIPE:
-        pytest.skip("needs pipes of 16 MiB: run it as root, with CAP_SYS_RESOURCE")
-    assert program.install(product, archive_of_the_future(patch_dir, 20000)) == INSTALLED
-    assert installed(product) == 20000
+def test_a_tar_that_warns_as_much_as_a_pipe_takes_ends(program, product, patch_dir):
+    """20,000 members say 1.8 MB; without CAP_SYS_RESOURCE a pipe holds 1 MiB at most."""
+    members = 20000 if pipe_of_the_own_user() >= LARGEST_PIPE else 8000
+    assert program.install(product, archive_of_the_future(patch_dir, members)) == INSTALLED
+    assert installed(product) == members
 
 
 def test_a_tar_that_warns_within_a_mebibyte_ends_for_an_ordinary_user(program, product, patch_dir):
