@@ -48,7 +48,7 @@ void syncSystem(const std::string &path) {
 void putBack(const std::string &saved, const std::string &target) {
   const std::optional<FileState> old = stateOf(saved);
   if (!old)
-    return; // put back by an undo before this one
+    return;
   const std::optional<FileState> now = stateOf(target);
   const bool isThere = now && now->device == old->device && now->inode == old->inode;
   const int result = isThere ? unlink(saved.c_str()) : rename(saved.c_str(), target.c_str());
@@ -64,19 +64,22 @@ void putBack(const std::string &saved, const std::string &target) {
   static_cast<void>(unlink(saved.c_str()));
 }
 
-/// Whether what stands at the path now was not put there by the installation that the record tells of. Of a
-/// run that was interrupted only the new files are known, by what they are not.
-bool isChangedSince(const TouchedFile &file, const FileState &now) {
-  return file.after && !isSameFile(*file.after, now);
+/// Whether the path has something else now than the installation left there. Nothing is known of that when
+/// the installation was interrupted: what is not the old file is then taken for the new one.
+bool isChangedSince(const Record &record, const TouchedFile &file, const FileState &now) {
+  const bool isKnown = record.phase == Phase::Installed || record.phase == Phase::Closed;
+  return isKnown && !(file.after && isSameFile(*file.after, now));
 }
 
-void restoreFile(const std::string &home, const std::string &folder, const TouchedFile &file,
-                 std::vector<std::string> &messages) {
+void restoreFile(const std::string &home, const std::string &folder, const Record &record,
+                 const TouchedFile &file, std::vector<std::string> &messages) {
   const std::string target = home + file.path;
+  if (file.before && !stateOf(savedPath(folder, file.saved)))
+    return; // not saved yet, or put back by an undo before this one
   const std::optional<FileState> now = stateOf(target);
   const bool isOld =
       now && file.before && now->device == file.before->device && now->inode == file.before->inode;
-  if (now && !isOld && isChangedSince(file, *now)) {
+  if (now && !isOld && isChangedSince(record, file, *now)) {
     messages.push_back(file.path + ": changed since the installation, left as it is");
     return;
   }
@@ -155,7 +158,7 @@ void noteInstalled(const std::string &home, Record &record) {
 void restoreFiles(const std::string &home, const std::string &folder, const Record &record,
                   std::vector<std::string> &messages) {
   for (const TouchedFile &file : record.files)
-    restoreFile(home, folder, file, messages);
+    restoreFile(home, folder, record, file, messages);
   for (const RewrittenFile &file : record.rewritten)
     restoreRewritten(home, folder, file, messages);
   for (const std::string &directory : record.temporary)

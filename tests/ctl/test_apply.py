@@ -203,6 +203,16 @@ def test_a_file_that_was_changed_since_is_left_alone(ctl, ready, write):
     assert home.read("lib/replaced") == b"old\n"
 
 
+def test_a_file_that_was_made_since_in_the_place_of_a_missing_one_is_left_alone(ctl, ready, write):
+    home = ready
+    patch = a_patch().script("go.sh", when="pre", body="rm updated_files/lib/new")
+    apply(ctl, home, write(patch), status=4)
+    home.write("lib/new", "mine\n")
+    taken = undo(ctl, home, status=4)
+    assert "lib/new: changed since the installation, left as it is" in taken["messages"]
+    assert home.read("lib/new") == b"mine\n"
+
+
 def test_only_the_newest_transaction_of_a_file_is_undone(ctl, ready, write):
     home = ready
     home.write("lib/replaced", "old\n")
