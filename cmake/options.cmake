@@ -4,7 +4,7 @@
 # is found again from other checkouts too.
 find_program(ORVPATCH_CCACHE ccache)
 if(ORVPATCH_CCACHE AND NOT DEFINED CMAKE_CXX_COMPILER_LAUNCHER)
-  set(CMAKE_CXX_COMPILER_LAUNCHER env CCACHE_SLOPPINESS=pch_defines,time_macros)
+  set(CMAKE_CXX_COMPILER_LAUNCHER env CCACHE_SLOPPINESS=pch_defines,time_macros,include_file_mtime,include_file_ctime)
   if(NOT ORVPATCH_HARDENED)
     list(APPEND CMAKE_CXX_COMPILER_LAUNCHER CCACHE_BASEDIR=${CMAKE_SOURCE_DIR} CCACHE_NOHASHDIR=1)
   endif()
@@ -12,7 +12,10 @@ if(ORVPATCH_CCACHE AND NOT DEFINED CMAKE_CXX_COMPILER_LAUNCHER)
 endif()
 
 add_library(orvpatch_options INTERFACE)
-target_compile_options(orvpatch_options INTERFACE -Wall -Wextra -Wpedantic -Wconversion -Wshadow)
+target_compile_options(orvpatch_options INTERFACE -Wall -Wextra -Wpedantic -Wconversion -Wshadow
+  # Precompiled headers whose users ccache can find again.
+  $<$<CXX_COMPILER_ID:GNU>:-fpch-preprocess>
+  "$<$<CXX_COMPILER_ID:Clang>:SHELL:-Xclang -fno-pch-timestamp>")
 if(ORVPATCH_WERROR)
   target_compile_options(orvpatch_options INTERFACE -Werror)
 endif()
