@@ -8,5 +8,5 @@ else()
 endif()
 string(TIMESTAMP ORVPATCH_BUILD_DATE "%m/%d/%y" ${zone})
 string(TIMESTAMP ORVPATCH_BUILD_TIME "%H:%M:%S" ${zone})
-# In one replacement: the next one would take what is left behind the first for the start of the text again.
+# In one replacement: "^" matches again behind what an earlier replacement took away.
 string(REGEX REPLACE "^0?([0-9]+)/0?([0-9]+)/" "\\1/\\2/" ORVPATCH_BUILD_DATE "${ORVPATCH_BUILD_DATE}")

@@ -6,7 +6,7 @@ execute_process(
   COMMAND ${CPACK_ORVPATCH_STRIP} --strip-all --remove-section=.comment --preserve-dates ${program}
   COMMAND_ERROR_IS_FATAL ANY)
 
-# Whatever the file mode creation mask of whoever packs.
+# Independent of the umask of the build.
 execute_process(COMMAND chmod -R u=rwX,go=rX ${staged} COMMAND_ERROR_IS_FATAL ANY)
 
 # With SOURCE_DATE_EPOCH all get that time, so that it does not matter when a checkout was made.

@@ -1,7 +1,6 @@
 # Run by cpack to make the .tar.gz of the staged files, and one of the debug symbols.
 
-# orvpatch_tarball(FOLDER NAME): sorted, and owned by root whoever makes it; all of one time where SOURCE_DATE_EPOCH
-# tells it.
+# orvpatch_tarball(FOLDER NAME): sorted and owned by root; all members have the time of SOURCE_DATE_EPOCH, if set.
 function(orvpatch_tarball folder name)
   if(DEFINED ENV{SOURCE_DATE_EPOCH})
     set(time --mtime=@$ENV{SOURCE_DATE_EPOCH})

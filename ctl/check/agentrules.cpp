@@ -68,7 +68,7 @@ void checkRunInfo(HostCheck &check) {
 void checkInstance(HostCheck &check, const Patch &patch, const DependentInstance &dependent) {
   const RunningInstance &instance = dependent.instance;
   uid_t user = 0;
-  // The monitoring server is started as the runner, whoever owned it.
+  // The monitoring server is started as the runner, not as its former owner.
   if (dependent.code == "kqa" || !ownerOf(instance.pid, user))
     return;
   const std::string where = dependent.code + (instance.name.empty() ? "" : " " + instance.name);

@@ -144,8 +144,8 @@ void fromRecord(const Home &home, Interruption &found) {
   }
 }
 
-/// Who owned the instances that the runs have stopped: an ordinary user can stop no others' than his own.
-/// For those of root's runs the log does not tell it, and they may be anybody's, unless the home is root's.
+/// The owner of the instances that the runs have stopped: an ordinary user can stop only instances of the
+/// same user. The log of root's runs does not tell it, and any user may own them, unless the home is root's.
 std::string ownerOfInstances(const Home &home, const LogFacts &log) {
   struct stat status = {};
   const bool isRoots = stat(home.path().c_str(), &status) == 0 && status.st_uid == 0;

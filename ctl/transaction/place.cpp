@@ -21,7 +21,7 @@ void makeDirectory(const std::string &path, mode_t mode) {
     throw RefusalError("cannot make " + path + ": " + strerror(errno));
 }
 
-/// Whoever can change the folder can change what an undo puts back.
+/// A user who can change the folder can change what an undo puts back.
 void demandPrivate(const std::string &path) {
   struct stat status = {};
   if (lstat(path.c_str(), &status) != 0)

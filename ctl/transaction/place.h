@@ -1,5 +1,5 @@
-// Where transactions lie: patchlogs/transactions/<UTC time>-<pid>/ of the home, closed to everybody but the
-// runner.
+// Where transactions lie: patchlogs/transactions/<UTC time>-<pid>/ of the home, accessible to the runner
+// alone.
 #pragma once
 
 #include <string>

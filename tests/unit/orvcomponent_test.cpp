@@ -280,7 +280,7 @@ TEST_F(IsRunningTest, AsksPsDirectlyAndThenForTheOwner) {
 
 TEST_F(IsRunningTest, ProcessThatPsDoesNotKnowDoesNotRun) {
   EXPECT_FALSE(isRunning("4711", owner_));
-  EXPECT_EQ(logLines(), commandLines({"ps", "-p", "4711"})) << "nobody asks for its owner";
+  EXPECT_EQ(logLines(), commandLines({"ps", "-p", "4711"})) << "its owner is not asked for";
 }
 
 // KEEP(pid-substring)

@@ -389,7 +389,7 @@ TEST_F(ProcessTest, CommandGivenAsWordsIsRunTheSameWay) {
                                   processTrace("cmdArray[5]: c"), processTrace("runCommand exit")}));
 }
 
-/// What the system gives to whoever runs the tests, up to what the tool asks for.
+/// The pipe size that the system gives this user, up to the size that the tool asks for.
 int largestPipeGiven() {
   constexpr int Wanted = 16 * 1024 * 1024;
   int ends[2] = {-1, -1};
