@@ -1,0 +1,123 @@
+"""What the modules that change a home have in common: the run that is found, waited for, and told."""
+
+from __future__ import absolute_import, division, print_function
+
+__metaclass__ = type
+
+import json
+
+from ansible_collections.orv.patch.plugins.module_utils import ctl, runs, transactions
+
+
+class Transacting:
+    """A module that brings about one job by a run of orvpatchctl."""
+
+    def __init__(self, module):
+        self.module = module
+        self.program = ctl.Ctl(module)
+        self.runs = runs.Runs(module.params["state_dir"], self.program.home)
+
+    def execute(self, work):
+        """Calls `work`, and tells the engine what stops it."""
+        try:
+            work()
+        except (ctl.CtlError, runs.StateError) as error:
+            self.fail(str(error))
+        except runs.Lost:
+            self.module.exit_json(changed=True, msg="the connection was lost; the run goes on")
+
+    def earlier(self, job):
+        """The run of the same job that no module has told yet, when it has ended; None when there is none. A run of
+        another job is waited for, and left alone."""
+        run = self.runs.find()
+        if run is None:
+            return None
+        self.wait(run)
+        if same_job(run.job, job):
+            return run
+        self.module.warn("an earlier run was waited for: %s" % outcome(run))
+        run.tell()
+        return None
+
+    def run(self, job, words):
+        """Starts the job, or finds it at work, and waits for its end."""
+        with self.runs.locked():
+            run = self.runs.find()
+            if run is None or not run.is_alive:
+                run = self.runs.start(job, [self.program.program] + words + ["--json"])
+        self.wait(run)
+        if not same_job(run.job, job):
+            self.fail("another run is at work on the home", verdict="refused")
+        return run
+
+    def wait(self, run):
+        if not run.wait(self.module.params["timeout"], runs.is_listened):
+            self.fail(
+                "not ended after %d seconds: it goes on, and this task will find it"
+                % self.module.params["timeout"],
+                verdict="running",
+            )
+
+    def record(self, run):
+        """The record of an ended run, None when it has none."""
+        try:
+            return json.loads(run.out)
+        except ValueError:
+            return None
+
+    def brief(self, record):
+        return transactions.brief(record, self.module.params["files"])
+
+    def fail(self, message, verdict="failed", record=None, **more):
+        more.update(levels_of(record))
+        self.module.fail_json(msg=message, verdict=verdict, record=self.brief(record), **more)
+
+    def succeed(self, changed, verdict, record, **more):
+        for key, value in levels_of(record).items():
+            more.setdefault(key, value)
+        if self.module._diff and changed and record is not None:
+            more["diff"] = transactions.difference(record)
+        self.module.exit_json(changed=changed, verdict=verdict, record=self.brief(record), **more)
+
+
+def levels_of(record):
+    patches = record["patches"] if record else []
+    return {
+        "transaction": record["id"]
+        if record and not record["dryRun"] and record["verdict"] != "refused"
+        else None,
+        "levels_before": dict((one["product"], one["levelBefore"]) for one in patches),
+        "levels_after": dict((one["product"], one["levelAfter"]) for one in patches),
+    }
+
+
+def same_job(one, other):
+    return all(one.get(key) == value for key, value in other.items())
+
+
+def outcome(run):
+    """How a run ended, in words."""
+    try:
+        return json.loads(run.out)["verdict"]
+    except (ValueError, KeyError, TypeError):
+        return ctl.said(run.err) or "it was killed"
+
+
+def reason(record, err):
+    """Why it did not end well: what the record and standard error have to say."""
+    said = []
+    if record:
+        said += [
+            "%(rule)s: %(where)s %(text)s" % one for one in record["findings"] if one["severity"] == "error"
+        ]
+        said += ["%(path)s: %(text)s" % one for one in record["differences"]]
+        if record["installer"]["status"]:
+            said.append(installer_said(record["installer"]))
+        said += record["messages"]
+    said.append(ctl.said(err))
+    return "; ".join(one for one in said if one) or "no reason was given"
+
+
+def installer_said(installer):
+    text = installer["stderr"].strip() or installer["stdout"].strip()
+    return "the installer ended with status %d: %s" % (installer["status"], " ".join(text.split()))
