@@ -1,10 +1,12 @@
 """Fixtures of all tests that run the real program: cases, fault tests and the tests of the support library."""
 
 import os
+import shutil
 
 import pytest
 
 from support import ProductHome, Program, remove_tree, scratch_folder, second_account
+from support.browser import Browser
 
 
 os.umask(0o022)  # expected modes are written for it, and other users must get into the homes
@@ -67,3 +69,13 @@ def other_owner(scratch):
     """An account beside root's that may log in (for tests that need root)."""
     with second_account(scratch) as account:
         yield account
+
+
+@pytest.fixture
+def browser(tmp_path):
+    """A browser with a profile of its own."""
+    if not shutil.which("chromium"):
+        pytest.skip("chromium is missing: scripts/setup browser")
+    started = Browser(tmp_path / "profile")
+    yield started
+    started.close()

@@ -3,28 +3,16 @@
 import json
 import os
 import re
-import shutil
 import stat
 import unicodedata
 from pathlib import Path
 
 import pytest
 
-from browser import Browser
-
 ID = "20260309T140500Z-77"
 HOSTILE = ["<script>console.error('ran')</script>", "<img src=x onerror=console.error(1)>", "a\"onload='x' b",
            "&lt;b&gt;", "</pre></main><h1>applied</h1>", "\x1b[31mred", "https://example.invalid/a.png",
            "\u202egnp.txt", "url(https://example.invalid/b)", "]]><!--"]
-
-
-@pytest.fixture(name="browser")
-def browser_fixture(tmp_path):
-    if not shutil.which("chromium"):
-        pytest.skip("chromium is missing: scripts/setup browser")
-    browser = Browser(tmp_path / "profile")
-    yield browser
-    browser.close()
 
 
 def shown(text):
@@ -79,10 +67,6 @@ def page_fixture(ctl, home):
     return make
 
 
-def texts_of(browser, selector):
-    return browser.run(f"[...document.querySelectorAll({json.dumps(selector)})].map(e => e.textContent)")
-
-
 def test_hostile_names_stay_text(page, browser):
     path = page(HOSTILE)
     browser.show(path)
@@ -90,10 +74,10 @@ def test_hostile_names_stay_text(page, browser):
         ["html", "head", "meta", "link", "title", "style", "body", "header", "h1", "p", "main", "dl", "dt", "dd", "h2",
          "h3", "table", "thead", "tbody", "tr", "th", "td", "code", "small", "br", "span", "svg", "text", "rect", "ul",
          "li", "pre"])
-    assert texts_of(browser, "h1") == ["undone"]
-    assert texts_of(browser, "ul.files li") == [shown(f"{place}/{text}") for place in ("gone", "old")
-                                                for text in HOSTILE]
-    assert texts_of(browser, "pre") == ["".join(f"{shown(text)}\n" for text in HOSTILE)] * 2
+    assert browser.texts("h1") == ["undone"]
+    assert browser.texts("ul.files li") == [shown(f"{place}/{text}") for place in ("gone", "old")
+                                            for text in HOSTILE]
+    assert browser.texts("pre") == ["".join(f"{shown(text)}\n" for text in HOSTILE)] * 2
     assert browser.requests == [path.as_uri(), "data:,"][:len(browser.requests)]
     assert browser.complaints == []
 
@@ -112,17 +96,17 @@ def test_the_page_asks_for_nothing(page, browser):
 def test_the_verdict_comes_first_and_all_of_the_record_follows(page, browser):
     browser.show(page(["one", "two"]))
     assert browser.run("document.body.firstElementChild.firstElementChild.textContent") == "undone"
-    assert texts_of(browser, "h2") == [
+    assert browser.texts("h2") == [
         "Products", "Steps", "2 differences", "2 messages", "2 findings", "Instances", "4 files", "2 other changes",
         "Output of the installer", "Errors of the installer"]
-    assert [row.split() for row in texts_of(browser, "table:first-of-type tbody tr")][0] == [
+    assert [row.split() for row in browser.texts("table:first-of-type tbody tr")][0] == [
         "one", "vemaoneone.tar" + "0" * 64 + "06.10.00.00", "→", "06.10.01.00FAIL"]
 
 
 def test_the_timeline_shows_each_step_where_and_as_long_as_it_ran(page, browser):
     browser.show(page(["one"]))
     total = 15.51
-    assert texts_of(browser, "svg text") == [
+    assert browser.texts("svg text") == [
         "take  0.01 s", "check  0.50 s", "save  0.00 s", "install  12.25 s  failed", "verify  0.75 s", "start  2.00 s"]
     bars = browser.run("""(() => {
         const whole = document.querySelector('svg').getBoundingClientRect();
@@ -143,11 +127,9 @@ def test_nothing_runs_out_of_the_window(page, browser, tmp_path, width, scheme):
     assert browser.run("document.documentElement.scrollWidth") <= width
     folder = Path(os.environ.get("ORVPATCH_PICTURES") or tmp_path)
     browser.picture(folder / f"record-{width}-{scheme}.png")
-    colours = browser.run("""(() => { const style = getComputedStyle(document.body);
-        return [style.color, style.backgroundColor].map(c => c.match(/\\d+/g).map(Number)
-            .slice(0, 3).reduce((a, b) => a + b)); })()""")
-    assert (colours[0] < colours[1]) == (scheme == "light")
-    assert abs(colours[0] - colours[1]) > 500
+    text, back = browser.brightness()
+    assert (text < back) == (scheme == "light")
+    assert abs(text - back) > 500
 
 
 def test_paper_is_white_even_where_the_screen_is_dark(page, browser):
@@ -161,21 +143,21 @@ def test_long_lists_and_outputs_are_cut_and_say_so(page, browser):
     browser.show(page(["one"], files=[{"path": name, "change": "new", "saved": "", "before": None, "after": None}
                                       for name in names],
                       installer={"status": 0, "stdout": output, "stderr": ""}))
-    assert texts_of(browser, "ul.files li") == names[:2000]
-    assert "New (3000)" in texts_of(browser, "h3")
-    text = texts_of(browser, "pre")[0]
+    assert browser.texts("ul.files li") == names[:2000]
+    assert "New (3000)" in browser.texts("h3")
+    text = browser.texts("pre")[0]
     assert text.endswith("line 19999\n") and len(text) < 70000
-    assert texts_of(browser, "p.soft") == ["The first 2000; record.json has all.",
-                                           "Commands of the patches, or others, did that; an undo leaves it.",
-                                           "The end of it; record.json has all."]
+    assert browser.texts("p.soft") == ["The first 2000; record.json has all.",
+                                       "Commands of the patches, or others, did that; an undo leaves it.",
+                                       "The end of it; record.json has all."]
 
 
 def test_an_undo_has_a_page_of_its_own(page, home, browser):
     page(["one"])
     own = [path for path in (home.path / "patchlogs/transactions").iterdir() if path.name != ID]
     browser.show(own[0] / "record.html")
-    assert texts_of(browser, "h1") == ["undone"]
-    assert ID in texts_of(browser, "dd")
+    assert browser.texts("h1") == ["undone"]
+    assert ID in browser.texts("dd")
 
 
 def test_a_page_that_cannot_be_written_is_told_in_the_record(ctl, home):

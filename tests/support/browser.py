@@ -57,6 +57,16 @@ class Browser:
         assert "exceptionDetails" not in answer, answer
         return answer["result"].get("value")
 
+    def texts(self, selector):
+        """The texts of all elements that a selector finds."""
+        return self.run(f"[...document.querySelectorAll({json.dumps(selector)})].map(e => e.textContent)")
+
+    def brightness(self):
+        """How bright the text and the background of the page are, each from 0 to 765."""
+        return self.run("""(() => { const style = getComputedStyle(document.body);
+            return [style.color, style.backgroundColor].map(c => c.match(/\\d+/g).map(Number)
+                .slice(0, 3).reduce((a, b) => a + b)); })()""")
+
     def picture(self, path):
         """Writes the whole page as a PNG file."""
         data = self.ask("Page.captureScreenshot", format="png", captureBeyondViewport=True)["data"]
