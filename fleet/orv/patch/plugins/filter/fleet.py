@@ -1,57 +1,89 @@
-"""From results of tasks to the document of the fleet."""
+"""From the results of the role's tasks to the document of the fleet."""
 
 from __future__ import absolute_import, division, print_function
 
 __metaclass__ = type
 
-GOOD = ("applied", "unchanged", "checked")
-UNTOUCHED = {"verdict": "untouched", "reason": ""}
+GOOD = ("applied", "unchanged", "checked", "untouched")
+STEPS = ("fixpack_facts", "fixpack_staged", "fixpack_check", "fixpack_result", "fixpack_verified")
 
 
-def outcome(result, before=None, **facts):
-    """One host's entry of the document: what the entry was `before`, and the `result` of one more task."""
-    entry = dict(
-        {
-            "batch": 0,
-            "started": None,
-            "ended": None,
-            "components": [],
-            "levelsBefore": {},
-            "levelsAfter": {},
-            "transaction": None,
-            "record": None,
-        },
-        **UNTOUCHED
-    )
-    entry.update(before or {})
-    entry.update(facts)
+def entry(variables):
+    """One host's entry of the document, from its variables: what the role has registered, step by step."""
+    made = {
+        "host": variables.get("inventory_hostname", ""),
+        "home": variables.get("fixpack_home", ""),
+        "batch": 0,
+        "verdict": "untouched",
+        "reason": "",
+        "components": [],
+        "levelsBefore": {},
+        "levelsAfter": {},
+        "transaction": None,
+        "record": None,
+    }
+    for step in STEPS:
+        add(made, variables.get(step) or {})
+    take_back(made, variables.get("fixpack_undone") or {})
+    return timed(made, variables.get("fixpack_batch") or {}, variables.get("fixpack_batch_end") or {})
+
+
+def add(made, result):
+    """What one more task has told."""
     if result.get("skipped"):
-        return entry
+        return
     if result.get("unreachable"):
-        return dict(entry, verdict="unreachable", reason=result.get("msg", ""))
-    if "components" in result:
-        entry.update(components=result["components"], levelsAfter=result.get("levels", {}))
-        entry["levelsBefore"] = entry["levelsBefore"] or result.get("levels", {})
+        made.update(verdict="unreachable", reason=result.get("msg", ""))
+        return
     if result.get("failed"):
-        entry.update(verdict=result.get("verdict", "failed"), reason=reason(result))
+        made.update(verdict=result.get("verdict", "failed"), reason=reason(result))
     elif result.get("verdict"):
-        entry.update(verdict=result["verdict"], reason="")
+        made.update(verdict=result["verdict"], reason="")
+    if "components" in result:
+        made.update(home=result["home"], components=result["components"], levelsAfter=result["levels"])
+        made["levelsBefore"] = made["levelsBefore"] or result["levels"]
     if result.get("verification"):
-        entry.update(verified(entry, result["verification"]))
+        hold_against(made, result["verification"])
     for key in ("transaction", "record"):
-        entry[key] = result.get(key) or entry[key]
-    return entry
+        made[key] = result.get(key) or made[key]
 
 
-def taken_back(result, before):
-    """The entry of a host whose transaction was to be taken back: why it was stays, and so does its record."""
-    if result.get("skipped") or result.get("verdict") == "unchanged":
-        return before
-    if result.get("unreachable") or result.get("failed"):
-        verdict = "unreachable" if result.get("unreachable") else "incomplete"
-        return dict(before, verdict=verdict, reason="not taken back: %s" % result.get("msg", ""))
-    why = before["reason"] or "taken back with its batch"
-    return dict(before, verdict="undone", reason=why, levelsAfter=result["levels_after"])
+def hold_against(made, verification):
+    """A home that differs from its patch is incomplete, whatever the transaction said."""
+    differences = verification["differences"]
+    if differences and made["verdict"] in GOOD:
+        said = ["%(path)s: %(text)s" % one for one in differences[:5]]
+        if len(differences) > 5:
+            said.append("and %d more" % (len(differences) - 5))
+        made.update(verdict="incomplete", reason="; ".join(said))
+
+
+def take_back(made, result):
+    """What the undo has told; why it was, and the record of what was taken back, stay."""
+    if not result or result.get("skipped") or result.get("verdict") == "unchanged":
+        return
+    if result.get("unreachable"):
+        made.update(verdict="unreachable", reason="not taken back: %s" % result.get("msg", ""))
+    elif result.get("failed"):
+        made.update(verdict="incomplete", reason="not taken back: %s" % result.get("msg", ""))
+    else:
+        made.update(
+            verdict="undone",
+            reason=made["reason"] or "taken back as was wanted",
+            levelsAfter=dict(made["levelsAfter"], **result["levels_after"]),
+            transaction=result["transaction"],
+            record=made["record"] or result["record"],
+        )
+
+
+def timed(made, batch, end):
+    """With the times of the transaction; where it has none, those of the batch."""
+    record = made["record"] if made["verdict"] != "unchanged" else None
+    reached = bool(batch.get("number"))
+    made["batch"] = batch.get("number", 0)
+    made["started"] = (record and record["started"]) or (batch["started"] if reached else None)
+    made["ended"] = (record and record["ended"]) or (end.get("ended") if reached else None)
+    return made
 
 
 def reason(result):
@@ -60,33 +92,24 @@ def reason(result):
     return "; ".join(said) or result.get("msg", "")
 
 
-def verified(entry, verification):
-    """A home that differs from its patch is incomplete, whatever the transaction said."""
-    differences = verification["differences"]
-    if not differences or entry["verdict"] not in GOOD:
-        return {}
-    text = "; ".join("%(path)s: %(text)s" % one for one in differences[:5])
-    more = "; and %d more" % (len(differences) - 5) if len(differences) > 5 else ""
-    return {"verdict": "incomplete", "reason": text + more}
-
-
-def is_bad(entry, undoing=False):
+def is_bad(made, undoing=False):
     """Whether an entry stops a rollout. One that was taken back does, unless that was what was wanted."""
-    return entry["verdict"] not in GOOD + ("untouched",) + (("undone",) if undoing else ())
+    return made["verdict"] not in GOOD + (("undone",) if undoing else ())
 
 
-def fleet(entries, patches, started, ended, rollout):
+def document(entries, patches, started, ended, rollout):
     """The document. In a rollout, a host that no batch has reached is untouched, whatever its check said."""
-    shown = []
-    for entry in entries:
-        if rollout and not entry["batch"] and entry["verdict"] in GOOD:
-            entry = dict(entry, **UNTOUCHED)
-        shown.append(entry)
+    shown = [
+        dict(made, verdict="untouched", reason="")
+        if rollout and not made["batch"] and not is_bad(made)
+        else made
+        for made in entries
+    ]
     return {"fleet": shown, "patches": patches, "started": started, "ended": ended}
 
 
 class FilterModule:
-    """orv.patch.outcome, orv.patch.taken_back, orv.patch.is_bad, orv.patch.fleet"""
+    """orv.patch.entry, orv.patch.is_bad, orv.patch.document"""
 
     def filters(self):
-        return {"outcome": outcome, "taken_back": taken_back, "is_bad": is_bad, "fleet": fleet}
+        return {"entry": entry, "is_bad": is_bad, "document": document}
