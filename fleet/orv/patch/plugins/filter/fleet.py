@@ -80,7 +80,7 @@ def timed(made, batch, end):
     """With the times of the transaction; where it has none, those of the batch."""
     record = made["record"] if made["verdict"] != "unchanged" else None
     reached = bool(batch.get("number"))
-    made["batch"] = batch.get("number", 0)
+    made["batch"] = int(batch.get("number", 0))
     made["started"] = (record and record["started"]) or (batch["started"] if reached else None)
     made["ended"] = (record and record["ended"]) or (end.get("ended") if reached else None)
     return made
