@@ -8,6 +8,7 @@
 #include "commands/command.h"
 #include "commands/commands.h"
 #include "memorylog.h"
+#include "signals.h"
 
 std::unique_ptr<CLI::App> makeApplication(Invocation &invocation) {
   auto application = std::make_unique<CLI::App>(
@@ -48,6 +49,8 @@ int parseAndRun(int argc, const char *const *argv) {
   } catch (const RefusalError &error) {
     fprintf(stderr, "orvpatchctl: %s\n", error.what());
     return Findings;
+  } catch (const Interrupted &interruption) {
+    endBySignal(interruption.signal);
   } catch (const std::bad_alloc &) {
     fputs("orvpatchctl: out of memory\n", stderr);
     return CannotJudge;

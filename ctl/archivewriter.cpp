@@ -15,10 +15,11 @@
 
 #include "filedescriptor.h"
 #include "judgement.h"
+#include "signals.h"
 
 namespace {
 
-constexpr std::size_t BlockSize = 64 * 1024;
+constexpr std::size_t BlockSize = 64UL * 1024;
 
 struct CloseDirectory {
   void operator()(DIR *stream) const { closedir(stream); }
@@ -67,7 +68,7 @@ void collect(const std::string &tree, const std::string &path, std::vector<Sourc
   files.push_back(file);
   if (S_ISDIR(file.status.st_mode))
     for (const std::string &name : namesIn(place))
-      collect(tree, path + "/" + name, files);
+      collect(tree, std::string(path).append("/").append(name), files);
 }
 
 /// Everything that goes into the archive, in its order.
@@ -171,6 +172,7 @@ void writePatchArchive(const std::string &tree, const std::string &archive,
   Writer writer(tree, archive);
   for (const SourceFile &file : files) {
     const std::int64_t time = S_ISDIR(file.status.st_mode) ? newest : file.status.st_mtime;
+    stopIfInterrupted();
     writer.add(file, std::min(time, latest.value_or(time)));
   }
   writer.close();

@@ -1,5 +1,5 @@
-// The archive of a patch, made from a source tree: the same bytes from the same tree, wherever and by
-// whomever it is made.
+// The archive of a patch, made from a source tree: the same bytes from the same tree, for any place, user and
+// time zone.
 #pragma once
 
 #include <cstdint>

@@ -15,6 +15,7 @@
 #include "filedescriptor.h"
 #include "judgement.h"
 #include "memoryfile.h"
+#include "signals.h"
 #include "utilities.h"
 
 namespace {
@@ -98,20 +99,24 @@ int exitStatus(int status) {
 
 int statusOf(pid_t child) {
   int status = 0;
-  while (waitpid(child, &status, 0) < 0)
+  while (waitpid(child, &status, 0) < 0) {
     if (errno != EINTR)
       return 127;
+    if (wasInterrupted())
+      kill(child, SIGKILL);
+  }
   return exitStatus(status);
 }
 
-/// Waits for the end, without taking the status; false when the time is over before.
+/// Waits for the end, without taking the status; false when the time is over, or an interruption comes,
+/// before.
 bool endsWithin(pid_t child, std::chrono::seconds limit) {
   const auto end = std::chrono::steady_clock::now() + limit;
   auto pause = std::chrono::microseconds(200);
   siginfo_t info = {};
   while (waitid(P_PID, static_cast<id_t>(child), &info, WEXITED | WNOWAIT | WNOHANG) == 0 &&
          info.si_pid == 0) {
-    if (std::chrono::steady_clock::now() > end)
+    if (std::chrono::steady_clock::now() > end || wasInterrupted())
       return false;
     std::this_thread::sleep_for(pause);
     pause = std::min(2 * pause, std::chrono::microseconds(20000));
@@ -160,6 +165,7 @@ ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironme
   if (!isInTime)
     kill(child, SIGKILL);
   const int status = statusOf(child);
+  stopIfInterrupted();
   return {status, out.text(), err.text(), isInTime};
 }
 

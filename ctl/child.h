@@ -25,7 +25,8 @@ struct ChildEnvironment {
 
 /// Runs words[0], an absolute path or a name looked up in the environment's PATH, with /dev/null as standard
 /// input, and waits for its end. Output goes to files in memory, so that no child waits for a reader.
-/// JudgementError when the system gives no process.
+/// JudgementError when the system gives no process; Interrupted when an interruption is noted meanwhile: the
+/// child is killed then.
 ChildResult runChild(const std::vector<std::string> &words, const ChildEnvironment &environment);
 
 /// A program in a session of its own, so that a hang-up of the terminal does not end it. What it says goes to

@@ -1,7 +1,10 @@
-// A folder of this process alone, mode 0700, that goes with everything in it when the object does.
+// A folder of this process alone, mode 0700, that goes with everything in it when the object does; an
+// interruption in between is noted (signals.h).
 #pragma once
 
 #include <string>
+
+#include "signals.h"
 
 class TemporaryFolder {
 public:
@@ -16,5 +19,6 @@ public:
   const std::string &path() const { return path_; } ///< without "/" at the end
 
 private:
+  InterruptionCatcher catcher_;
   std::string path_;
 };

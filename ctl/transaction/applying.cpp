@@ -11,6 +11,7 @@
 #include "homelock.h"
 #include "inputfile.h"
 #include "packages.h"
+#include "signals.h"
 #include "text.h"
 #include "transaction/changes.h"
 #include "transaction/instances.h"
@@ -53,6 +54,7 @@ public:
   }
 
   Record run(const std::string &path) {
+    const InterruptionCatcher catcher;
     try {
       if (!prepare(path))
         return refused();
@@ -90,16 +92,20 @@ private:
       return false;
     const std::vector<Patch> patches = applicablePatches(home_, taken_);
     planInstallation(home_, patches, record_);
-    if (options_.dryRun || !dialogue_.agree(record_))
+    const bool isAgreed = !options_.dryRun && dialogue_.agree(record_);
+    stopIfInterrupted();
+    if (!isAgreed)
       return false;
     hasCommands_ = std::any_of(patches.begin(), patches.end(), bringsCommands);
     if (hasCommands_)
       changes_.lookBefore(home_, record_);
     writeRecord(folder_, record_);
-    return step("save", [this] {
+    const bool saved = step("save", [this] {
       saveFiles(home_.path(), folder_, record_);
       return true;
     });
+    stopIfInterrupted();
+    return saved;
   }
 
   bool check(const std::string &original) {

@@ -1,7 +1,6 @@
 #include "transaction/instances.h"
 
 #include <algorithm>
-#include <csignal>
 
 #include "dependents.h"
 #include "orvcomponentregistry.h"
@@ -57,9 +56,4 @@ void startMissing(const Home &home, const std::vector<RecordedInstance> &wanted,
     }
     messages.push_back(nameOf(instance) + ": not started: " + error.text);
   }
-}
-
-void outlastInterruptions() {
-  for (const int number : {SIGINT, SIGTERM, SIGHUP, SIGQUIT, SIGPIPE})
-    static_cast<void>(signal(number, [](int) {}));
 }

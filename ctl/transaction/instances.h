@@ -16,7 +16,3 @@ bool stopInstances(const Home &home, const std::vector<std::string> &products,
 /// told.
 void startMissing(const Home &home, const std::vector<RecordedInstance> &wanted,
                   std::vector<std::string> &messages);
-
-/// From the first change to the last nothing but SIGKILL may end this process. The signals are caught, not
-/// ignored: the instances that it starts would inherit that.
-void outlastInterruptions();

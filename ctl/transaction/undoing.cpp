@@ -7,6 +7,7 @@
 #include "homelock.h"
 #include "judgement.h"
 #include "processes.h"
+#include "signals.h"
 #include "text.h"
 #include "transaction/instances.h"
 #include "transaction/page.h"

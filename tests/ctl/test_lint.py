@@ -3,6 +3,7 @@
 import gzip
 import os
 import shutil
+import signal
 import subprocess
 
 import pytest
@@ -166,3 +167,21 @@ def test_an_archive_larger_than_the_disk_is_not_unpacked(ctl, patch_dir, scratch
     result = ctl.run("lint", patch_dir / Patch("ox").filename)
     assert result.status == 2
     assert b"no room in" in result.err
+
+
+@pytest.mark.parametrize("number", [signal.SIGINT, signal.SIGTERM, signal.SIGHUP])
+def test_an_interruption_leaves_no_folder_behind(ctl, write, scratch, number):
+    folder = scratch / "temporary"
+    folder.mkdir()
+    patch = Patch("ox")
+    for index in range(8000):  # tar is at work when the signal comes
+        patch.file(f"data/{index}")
+    command = subprocess.Popen(
+        [*ctl.program.argv, "lint", write(patch)], env={"TMPDIR": str(folder)}, stdout=subprocess.PIPE
+    )
+    while not any(folder.iterdir()):
+        assert command.poll() is None
+    command.send_signal(number)
+    assert command.communicate(timeout=20) == (b"", None)
+    assert command.returncode == -number
+    assert list(folder.iterdir()) == []

@@ -4,6 +4,7 @@ import os
 import pty
 import re
 import select
+import signal
 import struct
 import subprocess
 import tempfile
@@ -106,3 +107,28 @@ def test_a_log_that_cannot_be_followed_ends_nothing(ctl, program, ready, large, 
     result = ctl.run("apply", ready, large, "--yes", "--installer", installer)
     assert result.status == 0, result
     assert log.is_dir() and ready.exists(f"lib/file{FILES - 1:04}")
+
+
+@pytest.mark.parametrize("answer, status", [(b"y\n", 0), (b"n\n", 1), (b"\n", 1), (b"\x03", -signal.SIGINT)])
+def test_the_question(ctl, ready, write, answer, status):
+    """What is answered on the terminal decides; Ctrl-C is no answer, and leaves nothing behind either."""
+    before = ready.tree()
+    archive = write(Patch("yn").file("bin/tool", "new\n"))
+    command, ours = pty.fork()
+    if command == 0:
+        os.execv(ctl.program.argv[0], [*ctl.program.argv, "apply", os.fspath(ready.path), os.fspath(archive)])
+    shown = b""
+    while b"Apply? [y/N] " not in shown:
+        shown += os.read(ours, 65536)
+    os.write(ours, answer)
+    try:
+        while os.read(ours, 65536):
+            pass
+    except OSError:  # the terminal was closed by its last process
+        pass
+    os.close(ours)
+    assert os.waitstatus_to_exitcode(os.waitpid(command, 0)[1]) == status
+    assert ready.exists("bin/tool") == (status == 0)
+    if status != 0:
+        changed = {path for path in ready.tree().keys() ^ before.keys() if "transactions/" in path}
+        assert changed == set()

@@ -1,5 +1,6 @@
-// Sets the clock of a program: preloaded by LD_PRELOAD, `time` answers what stands in the file that ORVPATCH_CLOCK
-// names, in seconds since the epoch. The file is read at each call: a test may set the clock while the program runs.
+// Sets the clock of a program: preloaded by LD_PRELOAD, `time` answers what stands in the file that
+// ORVPATCH_CLOCK names, in seconds since the epoch. The file is read at each call: a test may set the clock
+// while the program runs.
 
 #include <cstdio>
 #include <cstdlib>
