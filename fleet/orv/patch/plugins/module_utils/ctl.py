@@ -91,6 +91,5 @@ def document(out, err, status):
 
 def said(err):
     """Messages of orvpatchctl without the program's name in front of each."""
-    prefix = "orvpatchctl: "
-    lines = [line[len(prefix) :] if line.startswith(prefix) else line for line in err.splitlines()]
+    lines = [line.replace("orvpatchctl: ", "", 1) for line in err.splitlines()]
     return "; ".join(line for line in lines if line.strip())

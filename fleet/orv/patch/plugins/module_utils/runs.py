@@ -185,7 +185,8 @@ def is_listened(descriptor=1):
     """Whether something still reads what the module will print."""
     poll = select.poll()
     poll.register(descriptor, 0)
-    return not any(event & (select.POLLERR | select.POLLHUP | select.POLLNVAL) for _, event in poll.poll(0))
+    ended = select.POLLERR | select.POLLHUP | select.POLLNVAL
+    return not any(event & ended for fd, event in poll.poll(0))
 
 
 def _write(path, text):

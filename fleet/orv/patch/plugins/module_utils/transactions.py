@@ -108,25 +108,45 @@ def summary(record):
 
 
 def difference(record):
-    """Levels, files and instances before and after, for --diff."""
-    patches = record["patches"]
-    touched = [one for one in record["instances"]["before"] if one["product"] in record["dependents"]]
-    names = [(one["product"] + " " + one["name"]).strip() for one in touched]
-    replaced = sorted(one["path"] for one in record["files"] if one["change"] == "replaced")
-    new = sorted(one["path"] for one in record["files"] if one["change"] == "new")
+    """Levels, files and instances before and after a record's patches are applied, for --diff."""
+    replaced, new = changed_files(record)
     return [
-        _part(
-            "levels",
-            ["%(product)s %(levelBefore)s" % one for one in patches],
-            ["%(product)s %(levelAfter)s" % one for one in patches],
-        ),
-        _part(
-            "files",
-            replaced,
-            ["%s (replaced)" % path for path in replaced] + ["%s (new)" % path for path in new],
-        ),
-        _part("running instances", names, ["%s (stopped and started again)" % name for name in names]),
+        _part("levels", level_lines(record, "levelBefore"), level_lines(record, "levelAfter")),
+        _part("files", replaced, marked(replaced, "replaced") + marked(new, "new")),
+        _part("running instances", stopped(record), marked(stopped(record), "stopped and started again")),
     ]
+
+
+def difference_of_undo(record):
+    """The same of a record that is taken back."""
+    replaced, new = changed_files(record)
+    return [
+        _part("levels", level_lines(record, "levelAfter"), level_lines(record, "levelBefore")),
+        _part("files", replaced + new, marked(replaced, "put back")),
+        _part("running instances", stopped(record), marked(stopped(record), "stopped and started again")),
+    ]
+
+
+def level_lines(record, key):
+    return ["%s %s" % (patch["product"], patch[key]) for patch in record["patches"]]
+
+
+def changed_files(record):
+    """Paths of replaced files, and of new ones."""
+    return [
+        sorted(one["path"] for one in record["files"] if one["change"] == kind)
+        for kind in ("replaced", "new")
+    ]
+
+
+def stopped(record):
+    """The running instances of the products that the patches concern."""
+    running = [one for one in record["instances"]["before"] if one["product"] in record["dependents"]]
+    return [("%s %s" % (one["product"], one["name"])).strip() for one in running]
+
+
+def marked(names, word):
+    return ["%s (%s)" % (name, word) for name in names]
 
 
 def _part(name, before, after):

@@ -147,10 +147,7 @@ class Undoing:
             "transaction": target["id"] if target else None,
         }
         if self.module._diff and changed:
-            shown["diff"] = [
-                dict(part, before=part["after"], after=part["before"])
-                for part in transactions.difference(target)
-            ]
+            shown["diff"] = transactions.difference_of_undo(target)
         self.module.exit_json(
             changed=changed, verdict=verdict, record=self.transacting.brief(record), resumed=resumed, **shown
         )
