@@ -9,6 +9,7 @@ from __future__ import absolute_import, division, print_function
 
 __metaclass__ = type
 
+import datetime
 import errno
 import fcntl
 import hashlib
@@ -125,7 +126,7 @@ class Runs:
 
     def start(self, job, line):
         """Starts a run of this command line; `job` says what it is for."""
-        name = "%s-%d" % (time.strftime("%Y%m%dT%H%M%SZ", time.gmtime()), os.getpid())
+        name = "%s-%d" % (datetime.datetime.utcnow().strftime("%Y%m%dT%H%M%S.%fZ"), os.getpid())
         folder = os.path.join(self._folder, name)
         os.mkdir(folder, 0o700)
         _write(os.path.join(folder, "run.json"), json.dumps(dict(job, line=line)))
@@ -140,6 +141,8 @@ class Runs:
                 start_new_session=True,
             )
         _write(os.path.join(folder, "pid"), "%d\n" % process.pid)  # the shell's own line may take a moment
+        while not supervises(str(process.pid), folder) and process.poll() is None:
+            time.sleep(0.01)  # a program that was just started has no command line yet
         self._remove_old()
         run = Run(folder)
         run.process = process
@@ -190,9 +193,11 @@ def is_listened(descriptor=1):
 
 
 def _write(path, text):
-    with open(path + ".new", "w") as stream:
+    """The whole file or none; two modules may write the same one."""
+    fresh = "%s.%d" % (path, os.getpid())
+    with open(fresh, "w") as stream:
         os.fchmod(stream.fileno(), 0o600)
         stream.write(text)
         stream.flush()
         os.fsync(stream.fileno())
-    os.rename(path + ".new", path)
+    os.rename(fresh, path)
