@@ -132,7 +132,7 @@ def test_a_pass_that_was_followed_by_a_failure_counts_no_more(modules, ready, pa
 
 def test_a_patch_that_concerns_no_product_fails(modules, ready, patch_dir):
     found = modules.fail("applied", patch=Patch("zz").file("lib/a").write(patch_dir))
-    assert found["verdict"] == "refused"
+    assert found["verdict"] == "refused", found
     assert "status 34" in found["msg"]  # the installer: not applicable
 
 
@@ -157,7 +157,7 @@ def test_a_patch_that_would_be_refused_fails_in_check_mode_too(modules, ready, p
     before = product(home)
     messages = [modules.fail("applied", patch=path, check=check) for check in (True, False)]
     for found in messages:
-        assert found["verdict"] == "refused"
+        assert found["verdict"] == "refused", found
         assert "installer-refuses" in found["msg"] and "backlevel" in found["msg"]
     assert {name for name in product(home) if name not in before} <= {"tmp/kyn", "tmp/kyn/patch.ini"}
     assert home.history() == []
@@ -214,7 +214,7 @@ def test_other_digests_are_refused_before_anything_starts(modules, ready, patch_
     before = product(home)
     for digests in ({path.name: "0" * 64}, {}, {path.name: good, "missing.tar": good}):
         found = modules.fail("applied", patch=path, digests=digests)
-        assert found["verdict"] == "refused"
+        assert found["verdict"] == "refused", found
         assert found["msg"].startswith("not what it should be: ")
     assert product(home) == before
     assert not modules.state.exists()

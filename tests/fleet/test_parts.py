@@ -259,6 +259,16 @@ def test_a_run_has_status_and_both_outputs(runs):
     assert runs.find() is None
 
 
+def test_a_run_that_ends_has_its_status(runs):
+    """At no moment it seems to be gone without one: fifty short runs are watched as closely as can be."""
+    for _ in range(50):
+        run = started(runs, "exit 7")
+        while run.is_alive:
+            pass
+        assert run.status == 7
+        run.process.wait()
+
+
 def test_a_run_is_in_a_session_of_its_own(runs):
     run = started(runs, "ps -o sid= -o pgid= -p $$; umask; readlink /proc/self/fd/0; pwd")
     assert run.wait(60, lambda: True)

@@ -31,6 +31,7 @@ echo "$$" >"$folder/pid"
 "$@" >"$folder/out" 2>"$folder/err" </dev/null
 echo "$?" >"$folder/status.new"
 mv "$folder/status.new" "$folder/status"
+exit 0 # behind the last command, which a shell may run in its own place
 """
 
 
