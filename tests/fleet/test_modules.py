@@ -296,6 +296,26 @@ def test_a_program_that_prints_no_document_is_told(modules, ready, scratch):
     assert "none" in found["msg"]
 
 
+def test_a_run_without_a_record_has_failed_only_if_it_left_a_transaction_open(
+    modules, ready, patch_dir, ctl_binary, scratch
+):
+    """A stand-in ends in the middle as a crash does, once before and once after the first change."""
+    home, path = ready, a_patch().write(patch_dir)
+    stand_in = scratch / "orvpatchctl"
+    stand_in.write_text(
+        f'#!/bin/sh\n[ "$1" != apply ] && exec {ctl_binary} "$@"\necho "orvpatchctl: broken" >&2\nexit 2\n'
+    )
+    stand_in.chmod(0o755)
+    found = modules.fail("applied", patch=path, orvpatchctl=stand_in)
+    assert (found["verdict"], found["msg"], found["record"]) == ("refused", "broken", None)
+    modules.run("applied", patch=path)
+    record = home.path / "patchlogs/transactions" / transactions(home)[0] / "record.json"
+    record.write_text(json.dumps(dict(json.loads(record.read_bytes()), phase="installing", verdict=None)))
+    path = a_patch(level="06100200").write(patch_dir)
+    assert modules.fail("applied", patch=path, orvpatchctl=stand_in)["verdict"] == "failed"
+    assert modules.run("home_info")["open_transactions"] == transactions(home)
+
+
 # --- runs that outlive a module ---
 
 

@@ -241,12 +241,16 @@ class Applying:
         run.tell()
         if record and record["verdict"] == "applied":
             self.transacting.succeed(True, "applied", record, resumed=resumed)
-        verdict = record["verdict"] if record else "refused" if run.status in (1, 2) else "failed"
         if run.status is None:
-            self.transacting.fail(
-                "the run was killed: the same task takes it back and starts anew", resumed=resumed
-            )
+            text = "the run was killed: the same task takes it back and starts anew"
+            self.transacting.fail(text, resumed=resumed)
+        verdict = record["verdict"] if record else self._verdict_without_record()
         self.transacting.fail(transacting.reason(record, run.err), verdict, record, resumed=resumed)
+
+    def _verdict_without_record(self):
+        """Nothing was changed, unless a transaction was left open."""
+        kept = transactions.records(self.program.home)
+        return "refused" if all(transactions.has_ended(one) for one in kept) else "failed"
 
     def _options(self):
         params = self.module.params
