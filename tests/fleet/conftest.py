@@ -43,8 +43,6 @@ def network(program, ctl_binary):
     if reason:
         pytest.skip(reason)
     made = Network([program.binary, ctl_binary])
-    made.controller = Controller(made.folder / "c", made.prefix)
-    made.controller.inventory(made.inventory())
-    (made.controller.folder / "known_hosts").write_text(made.known_hosts())
+    made.controller = Controller.of(made, "c")
     yield made
     made.close()

@@ -40,6 +40,14 @@ class Controller:
         self.configure()
         self.inventory("localhost ansible_connection=local\n")
 
+    @classmethod
+    def of(cls, network, name):
+        """A controller on the switch of a network, which knows the keys of its hosts."""
+        made = cls(network.folder / name, network.prefix)
+        made.inventory(network.inventory())
+        (made.folder / "known_hosts").write_text(network.known_hosts(), encoding="utf-8")
+        return made
+
     def configure(self, **lines):
         """Writes the configuration; lines(forks="50") puts others in place of some."""
         text = _CONFIGURATION.format(folder=self.folder)
@@ -66,7 +74,7 @@ class Controller:
             **{**streams, **options},
         )
 
-    def run(self, program, *words, timeout=600, **options):
+    def run(self, program, *words, timeout=1200, **options):
         """(exit status, what it printed)."""
         process = self.start(program, *words, **options)
         try:

@@ -5,7 +5,6 @@ The network of the machine is not touched: the bridge too lives in a space of it
 
 import os
 import shutil
-import signal
 import subprocess
 import time
 from pathlib import Path
@@ -232,10 +231,20 @@ class Host:
 
     def cut_sessions(self):
         """Ends every connection of the host as a network does that forgets it; returns how many."""
-        sessions = [pid for pid, command in self.processes().items() if command.startswith("sshd: root")]
+        sessions = self.sessions()
         for pid in sessions:
             self.run("kill", "-KILL", pid, check=False)
         return len(sessions)
+
+    def sessions(self):
+        """The connections that are open."""
+        return [pid for pid, command in self.processes().items() if command.startswith("sshd: root")]
+
+    def module_ages(self):
+        """The seconds for which the engine's modules have been at work here."""
+        pids = [str(pid) for pid, command in self.processes().items() if command == "/usr/bin/python3"]
+        shown = self.run("ps", "-o", "etimes=", "-p", ",".join(pids), check=False).stdout if pids else ""
+        return [int(age) for age in shown.split()]
 
     def unplug(self):
         self.fleet.on_switch("ip", "link", "set", self.link, "down")
@@ -326,9 +335,3 @@ class Network:
 def _run(*words):
     done = subprocess.run([*map(str, words)], capture_output=True, text=True, check=False)
     assert done.returncode == 0, (words, done.stderr)
-
-
-def signal_group(process, number=signal.SIGKILL):
-    """Ends a controller with all that it has started here."""
-    os.killpg(process.pid, number)
-    process.communicate()

@@ -40,6 +40,7 @@ ORDER = [
     "failed",
     "incomplete",
     "refused",
+    "running",
     "unreachable",
     "undone",
     "untouched",
@@ -286,6 +287,30 @@ def test_five_thousand_homes_are_one_page(shows, browser):
     assert len(browser.texts("ul.tiles li")) == 5000
     assert browser.texts("header p")[1] == "5000 homes on 5000 hosts: 5000 applied"
     assert path.stat().st_size < 4 << 20
+
+
+MADE_UP = [7, "text", ["list"], {"a": {"b": []}}, [None], True]
+
+
+@pytest.mark.parametrize("value", MADE_UP, ids=repr)
+def test_what_a_host_makes_up_spoils_no_report(value):
+    """A host sends what it likes: the others of the fleet are told all the same."""
+    fields = [
+        "components",
+        "levelsBefore",
+        "levelsAfter",
+        "transaction",
+        "record",
+        "reason",
+        "started",
+        "batch",
+    ]
+    broken = [{**entry(name, "failed"), name: value} for name in fields]
+    broken += [entry(f"r-{name}", "failed", record=record(**{name: value})) for name in record()]
+    broken += [entry("component", components=[{"code": value, "level": value}])]
+    content = document(entry("good"), *broken)
+    for text in (as_page(content), as_json(content), as_csv(content)):
+        assert all(one["host"] in text for one in content["fleet"])
 
 
 # --- the verdict of the whole ----------------------------------------------------------------------------------

@@ -42,6 +42,8 @@ def add(made, result):
     if "components" in result:
         made.update(home=result["home"], components=result["components"], levelsAfter=result["levels"])
         made["levelsBefore"] = made["levelsBefore"] or result["levels"]
+    # A run that was cut off and found again has the levels before it; what was read now are those behind it.
+    made["levelsBefore"] = dict(made["levelsBefore"], **result.get("levels_before", {}))
     if result.get("verification"):
         hold_against(made, result["verification"])
     for key in ("transaction", "record"):

@@ -21,6 +21,11 @@ VERDICTS = [
         "The installer ended well, but the home is not as the patches want it, or the run was cut off.",
     ),
     ("refused", "bad", "Refused before anything was changed."),
+    (
+        "running",
+        "bad",
+        "The installation was still at work when the time was over; the next run finds its end.",
+    ),
     ("unreachable", "bad", "The host did not answer, or stopped answering."),
     ("undone", "warn", "Taken back: the home is as it was before."),
     ("untouched", "soft", "Its turn did not come; nothing was changed."),
@@ -103,31 +108,39 @@ def in_order(fleet):
     )
 
 
+_EMPTY = {
+    "host": "",
+    "home": "",
+    "batch": 0,
+    "verdict": "untouched",
+    "reason": "",
+    "started": None,
+    "ended": None,
+    "components": [],
+    "levelsBefore": {},
+    "levelsAfter": {},
+    "transaction": None,
+    "record": None,
+}
+
+
 def _filled(entry):
-    """An entry with every field, so that a home whose gathering broke off has a line as well."""
-    empty = {
-        "host": "",
-        "home": "",
-        "batch": 0,
-        "verdict": "untouched",
-        "reason": "",
-        "started": None,
-        "ended": None,
-        "components": [],
-        "levelsBefore": {},
-        "levelsAfter": {},
-        "transaction": None,
-        "record": None,
-    }
-    given = {name: value for name, value in entry.items() if value is not None}
-    return dict(empty, **given)
+    """An entry with every field, so that a home whose gathering broke off has a line as well; what a host made up, in
+    place of a field of this type, counts as nothing."""
+    found = dict(_EMPTY)
+    for name, value in entry.items():
+        expected = _EMPTY.get(name)
+        if value is not None and (expected is None or isinstance(value, type(expected))):
+            found[name] = value
+    found["components"] = [part for part in found["components"] if isinstance(part, dict)]
+    for name in ("levelsBefore", "levelsAfter"):
+        found[name] = dict((str(product), str(level)) for product, level in found[name].items())
+    return found
 
 
 def levels_of(entry):
     """[(product, level before, level now)], sorted; a level that is not known is empty."""
-    installed = {
-        part["code"]: part["level"] for part in entry["components"] if "level" in part and "code" in part
-    }
+    installed = {str(part.get("code", "")): str(part.get("level", "")) for part in entry["components"]}
     before = entry["levelsBefore"] or installed
     after = entry["levelsAfter"] or installed or before
     return [

@@ -93,7 +93,7 @@ def _counted(number, what):
 
 def _span(seconds):
     """A duration in words, "" when it is not known."""
-    if seconds is None:
+    if not isinstance(seconds, (int, float)):
         return ""
     if seconds < 60:
         return "%.3g s" % seconds if seconds < 10 else "%d s" % seconds
@@ -201,61 +201,57 @@ def _article(entry):
 
 
 def _record(record):
-    patches = [
-        "%s %s: %s"
-        % (
-            _code(one.get("file", "")),
-            _level(one.get("levelBefore", ""), one.get("levelAfter", "")),
-            _escaped(one.get("result") or "not tried"),
-        )
-        for one in _dicts(record, "patches")
-    ]
-    steps = [
-        "%s %s%s"
-        % (
-            _escaped(one.get("step", "")),
-            _span(one.get("seconds")),
-            "" if one.get("result") == "ok" else " " + _bad(one.get("result", "")),
-        )
-        for one in _dicts(record, "steps")
-    ]
-    differences = [
-        "%s %s: %s" % (_bad(one.get("kind", "")), _code(one.get("path", "")), _escaped(one.get("text", "")))
-        for one in _dicts(record, "differences")
-    ]
-    findings = [
-        "%s %s %s<br>%s<br><small>%s</small>"
-        % (
-            _bad("error") if one.get("severity") == "error" else '<span class="warn">warning</span>',
-            _code(one.get("rule", "")),
-            _code(one["where"]) if one.get("where") else "",
-            _escaped(one.get("text", "")),
-            _escaped(one.get("remedy", "")),
-        )
-        for one in _dicts(record, "findings")
-    ]
-    messages = [_code(line) for line in record.get("messages") or []]
     installer = record.get("installer") if isinstance(record.get("installer"), dict) else {}
-    status = (
-        ["installer: status %s" % _escaped(installer["status"])]
-        if installer.get("status") is not None
-        else []
-    )
     return "".join(
         [
-            _list("Patches", patches),
-            _list("Steps", steps + status),
-            _list("Differences", differences),
-            _list("Messages", messages),
-            _list("Findings", findings),
+            _list("Patches", [_patch(one) for one in _dicts(record, "patches")]),
+            _list("Steps", [_step(one) for one in _dicts(record, "steps")] + _status(installer)),
+            _list("Differences", [_difference(one) for one in _dicts(record, "differences")]),
+            _list("Messages", [_code(line) for line in _items(record, "messages")]),
+            _list("Findings", [_finding(one) for one in _dicts(record, "findings")]),
             _output("Errors of the installer", installer.get("stderr")),
             _output("Output of the installer", installer.get("stdout")),
         ]
     )
 
 
+def _patch(one):
+    levels = _level(one.get("levelBefore", ""), one.get("levelAfter", ""))
+    return "%s %s: %s" % (_code(one.get("file", "")), levels, _escaped(one.get("result") or "not tried"))
+
+
+def _step(one):
+    result = one.get("result", "")
+    said = "" if result == "ok" else " " + _bad(result)
+    return "%s %s%s" % (_escaped(one.get("step", "")), _span(one.get("seconds")), said)
+
+
+def _status(installer):
+    status = installer.get("status")
+    return [] if status is None else ["installer: status %s" % _escaped(status)]
+
+
+def _difference(one):
+    return "%s %s: %s" % (
+        _bad(one.get("kind", "")),
+        _code(one.get("path", "")),
+        _escaped(one.get("text", "")),
+    )
+
+
+def _finding(one):
+    severity = _bad("error") if one.get("severity") == "error" else '<span class="warn">warning</span>'
+    place = _code(one["where"]) if one.get("where") else ""
+    texts = (_escaped(one.get("text", "")), _escaped(one.get("remedy", "")))
+    return "%s %s %s<br>%s<br><small>%s</small>" % ((severity, _code(one.get("rule", "")), place) + texts)
+
+
 def _dicts(record, name):
-    return [one for one in record.get(name) or [] if isinstance(one, dict)]
+    return [one for one in _items(record, name) if isinstance(one, dict)]
+
+
+def _items(record, name):
+    return record[name] if isinstance(record.get(name), list) else []
 
 
 def _bad(text):
@@ -276,9 +272,9 @@ def _list(name, items):
 def _output(name, text):
     if not text:
         return ""
-    note = (
-        "" if len(text) <= MOST_OUTPUT else '<p class="soft">The end of it; the JSON document has all.</p>\n'
-    )
+    text, note = str(text), ""
+    if len(text) > MOST_OUTPUT:
+        note = '<p class="soft">The end of it; the JSON document has all.</p>\n'
     return "<h4>%s</h4>\n%s<pre>%s</pre>\n" % (name, note, _lines(text[-MOST_OUTPUT:]))
 
 
@@ -315,68 +311,50 @@ def _batches(summary):
     batches = summary["batches"]
     if not batches:
         return ""
-    rows = [
-        "<tr>%s</tr>\n"
-        % "".join(
-            [
-                _cell(
-                    "Batch",
-                    "%d%s"
-                    % (
-                        batch["batch"],
-                        " <small>canary</small>" if batch["batch"] == 1 and batch["homes"] == 1 else "",
-                    ),
-                    "short",
-                ),
-                _cell("Homes", str(batch["homes"]), "short"),
-                _cell("Verdicts", _counts(batch["counts"])),
-                _cell("Started", _escaped(batch["started"] or "not known"), "short"),
-                _cell("Took", _span(batch["seconds"]) or "not known", "short"),
-            ]
-        )
-        for batch in batches
+    timed = [batch for batch in batches if batch["seconds"] is not None]
+    names = ["Batch", "Homes", "Verdicts", "Started", "Took"]
+    table = _table("batches", names, [_batch_row(batch) for batch in batches])
+    return "<h2>Batches</h2>\n" + _timeline(timed) + table
+
+
+def _batch_row(batch):
+    canary = " <small>canary</small>" if batch["batch"] == 1 and batch["homes"] == 1 else ""
+    cells = [
+        _cell("Batch", str(batch["batch"]) + canary, "short"),
+        _cell("Homes", str(batch["homes"]), "short"),
+        _cell("Verdicts", _counts(batch["counts"])),
+        _cell("Started", _escaped(batch["started"] or "not known"), "short"),
+        _cell("Took", _span(batch["seconds"]) or "not known", "short"),
     ]
-    return (
-        "<h2>Batches</h2>\n"
-        + _timeline([batch for batch in batches if batch["seconds"] is not None])
-        + _table("batches", ["Batch", "Homes", "Verdicts", "Started", "Took"], rows)
-    )
+    return "<tr>%s</tr>\n" % "".join(cells)
 
 
 def _timeline(batches):
     if not batches:
         return ""
-    height, first = 40, min(moment(batch["started"]) for batch in batches)
+    first = min(moment(batch["started"]) for batch in batches)
     total = max(max(moment(batch["ended"]) for batch in batches) - first, 0.001)
-    parts = [
-        '<svg role="img" width="100%%" height="%d" aria-label="Timeline of the batches, %s">\n'
-        % (height * len(batches), _span(total))
-    ]
-    for row, batch in enumerate(batches):
-        kind = "failed" if any(KINDS.get(name, "bad") == "bad" for name in batch["counts"]) else "ok"
-        start = 100 * (moment(batch["started"]) - first) / total
-        parts.append(
-            '<text x="0" y="%d">batch %d: %s</text>\n'
-            % (row * height + 15, batch["batch"], _span(batch["seconds"]))
-        )
-        # What takes no time is seen too: a mark of two pixels.
-        for shape, left, width in (
-            ("rail", 0, "100%"),
-            (kind, start, "%.3f%%" % (100 * batch["seconds"] / total)),
-            (kind, min(start, 99.5), "2"),
-        ):
-            parts.append(
-                '<rect class="%s" height="10" x="%.3f%%" y="%d" width="%s"/>\n'
-                % (shape, left, row * height + 20, width)
-            )
-    return "".join(parts) + "</svg>\n"
+    head = '<svg role="img" width="100%%" height="%d" aria-label="Timeline of the batches, %s">\n'
+    bars = [_bar(batch, 40 * row, first, total) for row, batch in enumerate(batches)]
+    return head % (40 * len(batches), _span(total)) + "".join(bars) + "</svg>\n"
+
+
+def _bar(batch, top, first, total):
+    kind = "failed" if any(KINDS.get(name, "bad") == "bad" for name in batch["counts"]) else "ok"
+    start = 100 * (moment(batch["started"]) - first) / total
+    width = "%.3f%%" % (100 * batch["seconds"] / total)
+    # What takes no time is seen too: a mark of two pixels.
+    shapes = [("rail", 0, "100%"), (kind, start, width), (kind, min(start, 99.5), "2")]
+    text = '<text x="0" y="%d">batch %d: %s</text>\n' % (top + 15, batch["batch"], _span(batch["seconds"]))
+    rect = '<rect class="%s" height="10" x="%.3f%%" y="' + str(top + 20) + '" width="%s"/>\n'
+    return text + "".join(rect % shape for shape in shapes)
 
 
 def _products(fleet):
     """On how many homes each product went from which level to which."""
     counts, names = {}, {}
     for entry in fleet:
-        names.update({part.get("code"): part.get("name", "") for part in entry["components"]})
+        names.update({str(part.get("code", "")): part.get("name", "") for part in entry["components"]})
         for levels in levels_of(entry):
             counts[levels] = counts.get(levels, 0) + 1
     if not counts:
@@ -397,30 +375,21 @@ def _homes(fleet, anchors):
     """A line for each home; the anchor of one that is told above is there."""
     if not fleet:
         return ""
-    rows = [
-        "<tr%s>%s</tr>\n"
-        % (
-            "" if entry["anchor"] in anchors else ' id="%s"' % entry["anchor"],
-            "".join(
-                [
-                    _cell("Host", _named(entry)),
-                    _cell("Verdict", _verdict(entry), "short"),
-                    _cell("Batch", str(entry["batch"] or "–"), "short"),
-                    _cell(
-                        "Levels",
-                        "<br>".join(
-                            "%s %s" % (_code(product), _level(before, now))
-                            for product, before, now in levels_of(entry)
-                        )
-                        or "not known",
-                    ),
-                    _cell("Took", _span(seconds_between(entry["started"], entry["ended"])) or "–", "short"),
-                ]
-            ),
-        )
-        for entry in fleet
+    names = ["Host", "Verdict", "Batch", "Levels", "Took"]
+    return "<h2>All homes</h2>\n" + _table("homes", names, [_row(entry, anchors) for entry in fleet])
+
+
+def _row(entry, anchors):
+    levels = ["%s %s" % (_code(product), _level(before, now)) for product, before, now in levels_of(entry)]
+    anchor = "" if entry["anchor"] in anchors else ' id="%s"' % entry["anchor"]
+    cells = [
+        _cell("Host", _named(entry)),
+        _cell("Verdict", _verdict(entry), "short"),
+        _cell("Batch", str(entry["batch"] or "–"), "short"),
+        _cell("Levels", "<br>".join(levels) or "not known"),
+        _cell("Took", _span(seconds_between(entry["started"], entry["ended"])) or "–", "short"),
     ]
-    return "<h2>All homes</h2>\n" + _table("homes", ["Host", "Verdict", "Batch", "Levels", "Took"], rows)
+    return "<tr%s>%s</tr>\n" % (anchor, "".join(cells))
 
 
 def _named(entry):
