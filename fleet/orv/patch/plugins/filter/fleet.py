@@ -5,7 +5,7 @@ from __future__ import absolute_import, division, print_function
 __metaclass__ = type
 
 GOOD = ("applied", "unchanged", "checked", "untouched")
-STEPS = ("fixpack_facts", "fixpack_staged", "fixpack_check", "fixpack_result", "fixpack_verified")
+STEPS = ("facts", "made", "staged", "check", "result", "verified")
 
 
 def entry(variables):
@@ -23,7 +23,7 @@ def entry(variables):
         "record": None,
     }
     for step in STEPS:
-        add(made, variables.get(step) or {})
+        add(made, variables.get("fixpack_" + step) or {})
     take_back(made, variables.get("fixpack_undone") or {})
     return timed(made, variables.get("fixpack_batch") or {}, variables.get("fixpack_batch_end") or {})
 
