@@ -2,12 +2,14 @@
 
 #include <algorithm>
 
+#include "target.h"
+
 namespace {
 
 bool stopsInstances(const Patch &patch) {
-  const std::string &target = patch.name.getTarget();
+  const Target *const target = findTarget(patch.name.getTarget());
   const std::string product = patch.descriptor->getProductCode();
-  return target == "vema" || target == "vecm" || product == "kqa" || product == "kpt";
+  return (target != nullptr && target->stopsDependents) || product == "kqa" || product == "kpt";
 }
 
 } // namespace

@@ -9,13 +9,12 @@
 #include "file.h"
 #include "judgement.h"
 #include "memoryfile.h"
+#include "target.h"
 
 namespace {
 
 /// The installer reads a descriptor of any size that fits into memory; no honest one comes near this.
 constexpr std::size_t LargestDescriptor = 16 * 1024 * 1024;
-
-constexpr const char *targetOrder[] = {"vecm", "vems", "veps", "vepd", "vema"};
 
 /// A file without a name, in memory alone, with a path under which it can be read.
 class MemoryFile {
@@ -38,9 +37,7 @@ private:
 };
 
 std::size_t rankOf(const std::string &path) {
-  const PatchFileName name(File(path).getName());
-  return static_cast<std::size_t>(
-      std::find(std::begin(targetOrder), std::end(targetOrder), name.getTarget()) - std::begin(targetOrder));
+  return targetOrder(PatchFileName(File(path).getName()).getTarget());
 }
 
 /// tar extracts each member of that name in turn, so that the last one stays.

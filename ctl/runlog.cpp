@@ -7,6 +7,7 @@
 #include <utility>
 
 #include "patchfilename.h"
+#include "target.h"
 
 namespace {
 
@@ -69,9 +70,7 @@ std::string nameOf(const std::string &path) {
 
 /// The order of targets in which the installer applies what it has accepted.
 std::size_t rankOf(const std::string &patch) {
-  static constexpr const char *order[] = {"vecm", "vems", "veps", "vepd", "vema"};
-  const std::string target = PatchFileName(patch).getTarget();
-  return static_cast<std::size_t>(std::find(std::begin(order), std::end(order), target) - std::begin(order));
+  return targetOrder(PatchFileName(patch).getTarget());
 }
 
 const char *actionOf(const std::string &option) {

@@ -1,13 +1,12 @@
 #include "dcfpackageprocessor.h"
 
 #include <algorithm>
-#include <array>
 #include <cstdio>
-#include <cstring>
 
 #include <sys/stat.h>
 
 #include "failure.h"
+#include "target.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "dcfpackageprocessor"
@@ -21,51 +20,16 @@ bool isSpecial(const std::string &path) {
   return stat(path.c_str(), &status) == 0 && !S_ISREG(status.st_mode) && !S_ISDIR(status.st_mode);
 }
 
-/// The requirements of a target.
-struct TargetRule {
-  const char *target;
-  bool (*isInstalled)(const std::string &platform); ///< null when only the version file is required
-  const char *serverCode;                           ///< the server's own product; null for agents
-  const char *supportSuffix;                        ///< version file of another product's support for it
-};
-
-const std::array<TargetRule, 5> targetRules = {
-    {{"vems", [](const std::string &) { return Util::isVEMSInstalled(); }, "qa", "vms.ver"},
-     {"veps", [](const std::string &platform) { return Util::isVEPSInstalled(platform); }, "pt", "vps.ver"},
-     {"vepd", [](const std::string &platform) { return Util::isVEPDInstalled(platform); }, "dk", "vpd.ver"},
-     {"vema", nullptr, nullptr, nullptr},
-     {"vecm", nullptr, nullptr, nullptr}}};
-
-std::string versionFileOf(const TargetRule &rule, const std::string &code, const std::string &platform) {
-  if (rule.serverCode == nullptr || code == rule.serverCode)
-    return code + platform + ".ver";
-  return code + rule.supportSuffix;
-}
-
-void traceMissingSupport(const std::string &target, const char *product) {
-  if (target == "vems")
-    LOG_TRACE("VEMS support not installed for: %s", product);
-  else if (target == "vema")
-    LOG_TRACE("VEMA support not installed for: %s", product);
-  else if (target == "vecm")
-    LOG_TRACE("VECM support not installed for: %s", product);
-  else // KEEP(vepd-veps-words): the text for the desktop client is that of the portal server
-    LOG_TRACE("VEPS support not installed for: %s", product);
-}
-
 /// Whether the requirements of the patch's target are installed under the home.
 bool isSupported(const std::string &home, const PatchFileName &name) {
-  const std::string &target = name.getTarget();
+  const Target &target = *findTarget(name.getTarget()); // a valid name has one
   const std::string &platform = name.getFullPlatform();
-  const std::string code = Util::toLower(name.getProduct().substr(1));
-  const auto rule =
-      std::find_if(targetRules.begin(), targetRules.end(),
-                   [&target](const TargetRule &candidate) { return target == candidate.target; });
-  if (rule->isInstalled != nullptr && !rule->isInstalled(platform))
+  if (target.isServerInstalled != nullptr && !target.isServerInstalled(platform))
     return false;
-  if (Util::pathExists(home + "registry/" + versionFileOf(*rule, code, platform)))
+  const std::string code = Util::toLower(name.getProduct().substr(1));
+  if (Util::pathExists(home + "registry/" + versionFileName(&target, code, platform)))
     return true;
-  traceMissingSupport(target, name.getProduct().c_str());
+  LOG_TRACE("%s support not installed for: %s", target.logName, name.getProduct().c_str());
   return false;
 }
 
@@ -207,9 +171,9 @@ bool DCFPackageProcessor::sort() {
   LOG_TRACE("Total number of eligible patch files to sort: %d", static_cast<int>(processors.size()));
   if (processors.size() >= 2) {
     std::vector<PatchProcessor *> sorted;
-    for (const char *target : {"vecm", "vems", "veps", "vepd", "vema"})
+    for (const Target &target : targets)
       std::copy_if(processors.begin(), processors.end(), std::back_inserter(sorted),
-                   [target](PatchProcessor *processor) { return targetOf(*processor) == target; });
+                   [&target](PatchProcessor *processor) { return targetOf(*processor) == target.name; });
     processors.swap(sorted);
   }
   LOG_TRACE("DCFPackageProcessor::sort() - %s", "exit");

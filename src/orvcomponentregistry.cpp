@@ -5,6 +5,7 @@
 
 #include "file.h"
 #include "logger.h"
+#include "target.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "orvcomponentregistry"
@@ -65,16 +66,6 @@ VersionFile parseVersionFile(const std::vector<std::string> &lines) {
       addPrereq(line, content.prereqs);
   }
   return content;
-}
-
-ORVComponent::Type typeOf(const std::string &path, const std::string &fileName) {
-  if (contains(path, "vms.ver"))
-    return ORVComponent::TYPE_VEMS;
-  if (contains(path, "vps.ver"))
-    return ORVComponent::TYPE_VEPS;
-  if (contains(path, "vpd.ver"))
-    return ORVComponent::TYPE_VEPD;
-  return beginsWith(fileName, "zt") ? ORVComponent::TYPE_CLI : ORVComponent::TYPE_AGENT;
 }
 
 /// Between the product code and the extension; empty without one.
@@ -138,7 +129,6 @@ void ORVComponentRegistry::buildComponents() {
 void ORVComponentRegistry::buildComponent(const std::string &path, const std::string &cinfo) {
   LOG_TRACE("ORVComponentRegistry::buildComponent(%s) %s", path.c_str(), "entry");
   const std::string fileName = path.substr(path.rfind('/') + 1);
-  ORVComponent::Type type = typeOf(path, fileName);
   std::vector<std::string> lines;
   const int error = Util::readFileByLines(path.c_str(), lines);
   if (error != 0) {
@@ -148,18 +138,13 @@ void ORVComponentRegistry::buildComponent(const std::string &path, const std::st
   const VersionFile content = parseVersionFile(lines);
   const std::string code = fileName.substr(0, 2);
   const std::string arch = archOf(fileName);
-  if (code == "pt")
-    type = ORVComponent::TYPE_VEPS;
-  else if (code == "dk")
-    type = ORVComponent::TYPE_VEPD;
-
   std::unique_ptr<ORVComponent> component;
   if (code == "qa")
     component = std::make_unique<UNIXMonitoringServer>(home_, code, content.desc, content.vrmf, arch,
                                                        content.prereqs, cinfo);
   else
     component = std::make_unique<ORVComponent>(home_, code, content.desc, content.vrmf, arch, content.prereqs,
-                                               type, cinfo);
+                                               versionFileKind(path), cinfo);
   if (!content.vrmf.empty())
     components_.append(std::move(component));
   LOG_TRACE("ORVComponentRegistry::buildComponent %s", "exit");
@@ -192,4 +177,13 @@ ORVComponent *ORVComponentRegistry::findFirst(
     if (matches(*component))
       return component;
   return nullptr;
+}
+
+ORVComponent *getComponent(const std::string &code) {
+  ORVComponent::Type type = ORVComponent::TYPE_AGENT;
+  if (code == "kqa")
+    type = ORVComponent::TYPE_VEMS;
+  else if (code == "kpt")
+    type = ORVComponent::TYPE_VEPS;
+  return ORVComponentRegistry::getInstance()->getInstalledComponent(code, type);
 }

@@ -43,5 +43,9 @@ private:
   OwnedList<ORVComponent> components_;
 };
 
+/// The installed component that is started and stopped under a product code, a server or an agent; null when
+/// the product is not installed.
+ORVComponent *getComponent(const std::string &code);
+
 /// Text of config/.ConfigData/RunInfo under `home`; empty when it cannot be read.
 std::string getCInfo_Running(std::string home);

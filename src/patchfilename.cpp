@@ -5,6 +5,7 @@
 #include <vector>
 
 #include "logger.h"
+#include "target.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchfilename"
@@ -28,8 +29,6 @@ const std::array<PlatformFamily, 10> families = {{{"li", false},
                                                   {"sol", false},
                                                   {"winnt", true},
                                                   {"unix", true}}};
-
-const std::array<const char *, 5> targets = {"vema", "vems", "veps", "vepd", "vecm"};
 
 } // namespace
 
@@ -72,7 +71,7 @@ bool PatchFileName::parsePlatform(const std::string &part) {
 
 bool PatchFileName::parseTarget(const std::string &part) {
   target_ = part;
-  if (std::find(targets.begin(), targets.end(), part) == targets.end()) {
+  if (findTarget(part) == nullptr) {
     LOG_TRACE("Invalid target: %s", part.c_str());
     return false;
   }

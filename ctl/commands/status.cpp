@@ -13,8 +13,8 @@
 #include "commands/commands.h"
 #include "history.h"
 #include "home.h"
-#include "patchprocessor/patchprocessor.h"
 #include "table.h"
+#include "target.h"
 #include "text.h"
 #include "utilities.h"
 

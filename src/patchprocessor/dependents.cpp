@@ -6,6 +6,7 @@
 
 #include "logger.h"
 #include "orvcomponentregistry.h"
+#include "target.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchprocessor"
@@ -98,9 +99,9 @@ void printInstances(const ORVComponent &component, const Instances &instances) {
 } // namespace
 
 bool PatchProcessor::hasDependents() const {
-  const std::string target = patchFileName().getTarget();
+  const Target *const target = findTarget(patchFileName().getTarget());
   const std::string product = descriptor_->getProductCode();
-  if (target == "vema" || target == "vecm" || product == "kqa" || product == "kpt")
+  if ((target != nullptr && target->stopsDependents) || product == "kqa" || product == "kpt")
     return true;
   LOG_TRACE("This patch is not target for a vema or vecm, no dependents will be stopped");
   return false;

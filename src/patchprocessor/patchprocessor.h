@@ -130,12 +130,6 @@ private:
 /// Product code of the OS agent, which has its own restart rule.
 extern const std::string glbOsAgentPC;
 
-/// Kind of component that a patch is for, by the target of its file name.
-ORVComponent::Type targetKind(const std::string &target);
-
-/// The installed component of a product code; null when the product is not installed.
-ORVComponent *getComponent(const std::string &code);
-
 /// Puts on disk, in one call, what the file system of `directory` still has to write. A system that cannot do
 /// it does not keep a patch from being installed.
 void flushToDisk(const std::string &directory);

@@ -7,27 +7,10 @@
 
 #include "failure.h"
 #include "orvcomponentregistry.h"
+#include "target.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchprocessor"
-
-ORVComponent::Type targetKind(const std::string &target) {
-  static const std::map<std::string, ORVComponent::Type> kinds = {{"vems", ORVComponent::TYPE_VEMS},
-                                                                  {"veps", ORVComponent::TYPE_VEPS},
-                                                                  {"vepd", ORVComponent::TYPE_VEPD},
-                                                                  {"vecm", ORVComponent::TYPE_CLI}};
-  const auto found = kinds.find(target);
-  return found == kinds.end() ? ORVComponent::TYPE_AGENT : found->second;
-}
-
-ORVComponent *getComponent(const std::string &code) {
-  ORVComponent::Type type = ORVComponent::TYPE_AGENT;
-  if (code == "kqa")
-    type = ORVComponent::TYPE_VEMS;
-  else if (code == "kpt")
-    type = ORVComponent::TYPE_VEPS;
-  return ORVComponentRegistry::getInstance()->getInstalledComponent(code, type);
-}
 
 namespace {
 

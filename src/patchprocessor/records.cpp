@@ -11,6 +11,7 @@
 #include "failure.h"
 #include "filedescriptor.h"
 #include "signalguard.h"
+#include "target.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchprocessor"
@@ -60,28 +61,6 @@ std::string now() {
   return text;
 }
 
-/// Suffix of the version file of a server's support for another product; null for kinds that have none.
-struct Support {
-  const char *serverCode; ///< the server itself has a version file for its platform
-  const char *suffix;
-};
-
-const Support *supportOf(ORVComponent::Type kind) {
-  static const Support vems = {"qa", "vms.ver"};
-  static const Support veps = {"pt", "vps.ver"};
-  static const Support vepd = {"dk", "vpd.ver"};
-  switch (kind) {
-  case ORVComponent::TYPE_VEMS:
-    return &vems;
-  case ORVComponent::TYPE_VEPS:
-    return &veps;
-  case ORVComponent::TYPE_VEPD:
-    return &vepd;
-  default:
-    return nullptr;
-  }
-}
-
 } // namespace
 
 void flushToDisk(const std::string &directory) {
@@ -93,17 +72,12 @@ void flushToDisk(const std::string &directory) {
 std::string getVerFileName(const PatchDescriptor *descriptor, const std::string &home,
                            const std::string &patchFilePath) {
   const PatchFileName fileName(File(patchFilePath).getName());
-  const ORVComponent::Type kind = targetKind(fileName.getTarget());
+  const Target *const target = findTarget(fileName.getTarget());
   const std::string product = Util::toLower(descriptor->getProductCode());
-  const std::string code = product.empty() ? "" : product.substr(1);
-  const std::string registry = home + "registry/";
   // KEEP(vecm-zt-file): a command-line patch updates the file of "zt", whatever its own product code.
-  if (kind == ORVComponent::TYPE_CLI)
-    return registry + "zt" + fileName.getFullPlatform() + ".ver";
-  const Support *const support = supportOf(kind);
-  if (support != nullptr && code != support->serverCode)
-    return registry + code + support->suffix;
-  return registry + code + fileName.getFullPlatform() + ".ver";
+  const bool isCommandLine = target != nullptr && target->kind == ORVComponent::TYPE_CLI;
+  const std::string code = isCommandLine ? target->ownCode : product.substr(product.empty() ? 0 : 1);
+  return home + "registry/" + versionFileName(target, code, fileName.getFullPlatform());
 }
 
 bool PatchProcessor::updatePatchVerFile(PatchError *err) {

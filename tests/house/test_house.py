@@ -25,6 +25,7 @@ LEVELS = [
     {"newdirectories", "symboliclinks"},
     {"file", "inifile"},
     {"orvcomponent"},
+    {"target"},
     {"orvcomponentregistry", "patchfilename", "patchdescriptor"},
     {"patchprocessor"},
     {"dcfpackageprocessor"},

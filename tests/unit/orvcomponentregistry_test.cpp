@@ -384,4 +384,19 @@ TEST_F(RegistryTest, EndOfAnotherRegistryLeavesTheOneInstance) {
   EXPECT_EQ(ORVComponentRegistry::getInstance(), instance);
 }
 
+TEST_F(RegistryTest, ComponentOfACodeIsTheServerOrTheAgent) {
+  for (const char *file : {"qalpp266.ver", "qavms.ver", "ptlpp266.ver", "oxlpp266.ver", "oxvms.ver",
+                           "dklpp266.ver", "ztlpp266.ver", "xevps.ver"})
+    install(file, "06100000", file);
+  static_cast<void>(registry());
+  ASSERT_NE(getComponent("kqa"), nullptr);
+  EXPECT_EQ(getComponent("kqa")->getType(), ORVComponent::TYPE_VEMS);
+  ASSERT_NE(getComponent("kpt"), nullptr);
+  EXPECT_EQ(getComponent("kpt")->getType(), ORVComponent::TYPE_VEPS);
+  ASSERT_NE(getComponent("kox"), nullptr);
+  EXPECT_EQ(getComponent("kox")->getDescriptiveName(), "oxlpp266.ver");
+  for (const char *code : {"kdk", "kzt", "kxe", "ox", ""})
+    EXPECT_EQ(getComponent(code), nullptr) << code;
+}
+
 } // namespace

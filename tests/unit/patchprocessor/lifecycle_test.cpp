@@ -296,20 +296,6 @@ TEST_F(LifecycleTest, CleanUpThatMayNotDeleteIsCode27) {
   EXPECT_TRUE(fs::exists(tempDir() + "/locked/file"));
 }
 
-TEST_F(LifecycleTest, ComponentOfACodeIsTheServerOrTheAgent) {
-  for (const char *file : {"qalpp266.ver", "qavms.ver", "ptlpp266.ver", "oxlpp266.ver", "oxvms.ver",
-                           "dklpp266.ver", "ztlpp266.ver", "xevps.ver"})
-    install(file, "06100000", file);
-  ASSERT_NE(getComponent("kqa"), nullptr);
-  EXPECT_EQ(getComponent("kqa")->getType(), ORVComponent::TYPE_VEMS);
-  ASSERT_NE(getComponent("kpt"), nullptr);
-  EXPECT_EQ(getComponent("kpt")->getType(), ORVComponent::TYPE_VEPS);
-  ASSERT_NE(getComponent("kox"), nullptr);
-  EXPECT_EQ(getComponent("kox")->getDescriptiveName(), "oxlpp266.ver");
-  for (const char *code : {"kdk", "kzt", "kxe", "ox", ""})
-    EXPECT_EQ(getComponent(code), nullptr) << code;
-}
-
 TEST_F(LifecycleTest, OsAgentIsKox) {
   EXPECT_EQ(glbOsAgentPC, "kox");
 }

@@ -70,24 +70,6 @@ TEST_F(PrereqTest, ProductThatIsNotInstalledIsCode9) {
             joined({pps({Entry}), {ppError(message)}, pps({"PatchProcessor::checkPrereqs() = 0"})}));
 }
 
-struct Target {
-  const char *word;
-  ORVComponent::Type kind;
-};
-
-class TargetTest : public PrereqTest, public ::testing::WithParamInterface<Target> {};
-
-TEST_P(TargetTest, WordTellsTheKind) {
-  EXPECT_EQ(targetKind(GetParam().word), GetParam().kind);
-}
-
-INSTANTIATE_TEST_SUITE_P(
-    Words, TargetTest,
-    ::testing::Values(Target{"vems", ORVComponent::TYPE_VEMS}, Target{"veps", ORVComponent::TYPE_VEPS},
-                      Target{"vepd", ORVComponent::TYPE_VEPD}, Target{"vecm", ORVComponent::TYPE_CLI},
-                      Target{"vema", ORVComponent::TYPE_AGENT}, Target{"VEMS", ORVComponent::TYPE_AGENT},
-                      Target{"vemsx", ORVComponent::TYPE_AGENT}, Target{"", ORVComponent::TYPE_AGENT}));
-
 /// A patch file, the version file that would satisfy it, and whether that one counts.
 struct Installed {
   const char *patch;

@@ -13,6 +13,7 @@
 
 #include <gtest/gtest.h>
 
+#include "orvcomponentregistry.h"
 #include "patchhome.h"
 
 namespace {
