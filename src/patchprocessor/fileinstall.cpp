@@ -11,12 +11,15 @@
 
 #include "failure.h"
 #include "newdirectories.h"
+#include "patchprocessor/workingdirectory.h"
 #include "signalguard.h"
 #include "utilities.h"
 
 #define LOG_COMPONENT "patchprocessor"
 
 namespace {
+
+constexpr const char *UpdatedFiles = "/updated_files";
 
 bool isSameDirectory(const struct stat &a, const struct stat &b) {
   return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
@@ -61,16 +64,7 @@ bool visitEntries(File &directory, const Walk &walk, bool (*visit)(File &entry, 
          std::all_of(files.begin(), files.end(), visitEntry);
 }
 
-bool moveRegularFile(File &entry, const Walk &walk) {
-  const std::string source = entry.getAbsolutePath(walk.directory);
-  const std::string destination = walk.home + entry.getPath();
-  if (!entry.moveFile(destination, true))
-    return FAILURE(walk.err, PatchError::CannotMoveFile, "ERROR_PP_MOVE_FILE", source.c_str(),
-                   destination.c_str());
-  LOG_INFO_MESSAGE("PP_MOVE_FILE", source.c_str(), entry.getPath().c_str());
-  return true;
-}
-
+/// `path` ends in "/": what exists there is a directory.
 bool makeTargetDirectory(const std::string &path, const Walk &walk) {
   File target(path);
   if (target.exists())
@@ -83,20 +77,32 @@ bool makeTargetDirectory(const std::string &path, const Walk &walk) {
   return walk.err == nullptr;
 }
 
-bool moveEntry(File &entry, const Walk &walk) {
+bool installFile(File &file, const Walk &walk) {
+  const std::string source = file.getAbsolutePath(walk.directory);
+  const std::string destination = walk.home + file.getPath();
+  if (!file.moveFile(destination, true))
+    return FAILURE(walk.err, PatchError::CannotMoveFile, "ERROR_PP_MOVE_FILE", source.c_str(),
+                   destination.c_str());
+  LOG_INFO_MESSAGE("PP_MOVE_FILE", source.c_str(), file.getPath().c_str());
+  return true;
+}
+
+/// Moves an entry, with everything below it.
+bool moveTree(File &entry, const Walk &walk) {
   LOG_TRACE("PatchProcessor::moveFile() %s", "entry");
   bool result = false;
   if (entry.isDirectory())
-    result = makeTargetDirectory(walk.home + entry.getPath(), walk) && visitEntries(entry, walk, moveEntry);
+    result = makeTargetDirectory(walk.home + entry.getPath(), walk) && visitEntries(entry, walk, moveTree);
   else
-    result = moveRegularFile(entry, walk);
+    result = installFile(entry, walk);
   LOG_TRACE("PatchProcessor::moveFile() %s", "exit");
   return result;
 }
 
-bool listEntry(File &entry, const Walk &walk) {
+/// Lists an entry, with everything below it.
+bool listTree(File &entry, const Walk &walk) {
   if (entry.isDirectory())
-    return visitEntries(entry, walk, listEntry);
+    return visitEntries(entry, walk, listTree);
   const std::string source = Util::removeDotFromPath(entry.getAbsolutePath(walk.directory));
   const std::string target = Util::removeDotFromPath(walk.home + entry.getPath());
   LOG_INFO("%s --> %s", source.c_str(), target.c_str());
@@ -106,20 +112,16 @@ bool listEntry(File &entry, const Walk &walk) {
 
 } // namespace
 
-std::string PatchProcessor::sourceRoot() const {
-  return Util::getTempDir(descriptor_->getProductCode()) + "/updated_files";
-}
-
 bool PatchProcessor::moveFiles(PatchError *err) {
   LOG_TRACE("PatchProcessor::moveFiles() %s", "entry");
-  const std::string previousDirectory = Util::getCurrentDirectory();
-  const std::string source = sourceRoot();
+  const std::string source = contentDir() + UpdatedFiles;
   if (!Util::pathExists(source)) {
     LOG_INFO_MESSAGE("PP_NO_FILES");
     return true;
   }
-  if (!Util::setCurrentDirectory(source))
-    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", source.c_str());
+  WorkingDirectory workingDirectory;
+  if (!workingDirectory.enter(source, err))
+    return false;
   LOG_INFO_MESSAGE("PP_MOVE_FILES", source.c_str(), Util::getQuillHome().c_str());
   // Before the first old file is removed: after a power failure every file is then either the old one or the
   // new one, never an empty one.
@@ -127,8 +129,7 @@ bool PatchProcessor::moveFiles(PatchError *err) {
   mayHaveMoved_ = true;
   File root(".");
   bool result = moveFile(&root, err);
-  if (!Util::setCurrentDirectory(previousDirectory))
-    result = FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", previousDirectory.c_str());
+  result = workingDirectory.leave(err) && result;
   // KEEP(movefiles-exit-name): the result line names the operation without its "s".
   LOG_TRACE("PatchProcessor::moveFile() = %d", result);
   return result;
@@ -138,38 +139,31 @@ bool PatchProcessor::moveFile(File *entry, PatchError *err) {
   // An interruption would leave a file without its owner and mode, which no repetition could restore.
   const SignalGuard guard;
   NewDirectories made;
-  return moveEntry(*entry, walkFromHere(err, &made));
+  return moveTree(*entry, walkFromHere(err, &made));
 }
 
 bool PatchProcessor::listFiles(PatchError *err) {
   LOG_TRACE("PatchProcessor::listFiles() %s", "entry");
-  const bool result = listTree(err);
+  const std::string source = contentDir() + UpdatedFiles;
+  bool result = false;
+  WorkingDirectory workingDirectory;
+  if (!Util::pathExists(source)) {
+    // KEEP(list-no-files-false): unlike an installation, the report of a patch without files is not a
+    // success.
+    LOG_INFO_MESSAGE("PP_NO_FILES");
+  } else if (workingDirectory.enter(source, err)) {
+    const std::string heading = NLS::getString("PP_LIST_FILES");
+    LOG_INFO("%s", heading.c_str());
+    printf("\n%s\n", heading.c_str());
+    File root(".");
+    result = listFile(&root, err);
+    result = workingDirectory.leave(err) && result;
+  }
   printf("\n");
   LOG_TRACE("PatchProcessor::listFiles() %s", "exit");
   return result;
 }
 
-bool PatchProcessor::listTree(PatchError *err) {
-  const std::string previousDirectory = Util::getCurrentDirectory();
-  const std::string source = sourceRoot();
-  if (!Util::pathExists(source)) {
-    // KEEP(list-no-files-false): unlike an installation, the report of a patch without files is not a
-    // success.
-    LOG_INFO_MESSAGE("PP_NO_FILES");
-    return false;
-  }
-  if (!Util::setCurrentDirectory(source))
-    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", source.c_str());
-  const std::string heading = NLS::getString("PP_LIST_FILES");
-  LOG_INFO("%s", heading.c_str());
-  printf("\n%s\n", heading.c_str());
-  File root(".");
-  bool result = listFile(&root, err);
-  if (!Util::setCurrentDirectory(previousDirectory))
-    result = FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", previousDirectory.c_str());
-  return result;
-}
-
 bool PatchProcessor::listFile(File *entry, PatchError *err) {
-  return listEntry(*entry, walkFromHere(err));
+  return listTree(*entry, walkFromHere(err));
 }

@@ -4,6 +4,7 @@
 #include <cstdio>
 
 #include "failure.h"
+#include "patchprocessor/workingdirectory.h"
 #include "process.h"
 #include "utilities.h"
 
@@ -88,6 +89,10 @@ std::string PatchProcessor::tempDir() const {
   return Util::getTempDir(patchFileName().getProduct());
 }
 
+std::string PatchProcessor::contentDir() const {
+  return Util::getTempDir(descriptor_->getProductCode());
+}
+
 bool PatchProcessor::initialize(PatchError *err) {
   LOG_TRACE("PatchProcessor::initialize() %s", "entry");
   bool result = extractINI(err);
@@ -104,39 +109,34 @@ bool PatchProcessor::initialize(PatchError *err) {
 
 bool PatchProcessor::extract(PatchError *err) {
   LOG_TRACE("PatchProcessor::extract() %s", "entry");
-  std::string archive;
-  std::string previousDirectory;
-  if (!enterTempDir(archive, previousDirectory, err))
-    return false;
-  const bool result = runTar({}, archive, err);
-  static_cast<void>(Util::setCurrentDirectory(previousDirectory)); // it was the current one a moment ago
-  LOG_TRACE("PatchProcessor::extract() = %d", result);
-  return result;
+  const std::optional<bool> result = unpack({}, err);
+  if (result.has_value())
+    LOG_TRACE("PatchProcessor::extract() = %d", *result);
+  return result.value_or(false);
 }
 
 bool PatchProcessor::extractINI(PatchError *err) {
   LOG_TRACE("PatchProcessor::extractINI() %s", "entry");
-  std::string archive;
-  std::string previousDirectory;
-  if (!enterTempDir(archive, previousDirectory, err))
-    return false;
-  const bool result = runTar({"patch.ini"}, archive, err);
-  static_cast<void>(Util::setCurrentDirectory(previousDirectory));
-  LOG_TRACE("PatchProcessor::extractINI() = %d", result);
-  return result;
+  const std::optional<bool> result = unpack({"patch.ini"}, err);
+  if (result.has_value())
+    LOG_TRACE("PatchProcessor::extractINI() = %d", *result);
+  return result.value_or(false);
 }
 
-/// Makes the temporary directory and changes into it. Gives back the absolute path of the archive, which may
-/// have been given relative to the directory that is left.
-bool PatchProcessor::enterTempDir(std::string &archive, std::string &previousDirectory, PatchError *err) {
+/// Unpacks these members, or all, in the temporary directory, which is made before. No result, and no result
+/// line, when it cannot be entered.
+std::optional<bool> PatchProcessor::unpack(const std::vector<std::string> &members, PatchError *err) {
   const std::string directory = tempDir();
-  if (!File(directory).mkdir())
-    return FAILURE(err, PatchError::CannotExtract, "ERROR_PP_MAKE_DIR", directory.c_str());
-  archive = File(patchFilePath_).getAbsolutePath();
-  previousDirectory = Util::getCurrentDirectory();
-  if (!Util::setCurrentDirectory(directory))
-    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", directory.c_str());
-  return true;
+  if (!File(directory).mkdir()) {
+    FAILURE(err, PatchError::CannotExtract, "ERROR_PP_MAKE_DIR", directory.c_str());
+    return std::nullopt;
+  }
+  // The path may have been given relative to the directory that is left.
+  const std::string archive = File(patchFilePath_).getAbsolutePath();
+  WorkingDirectory workingDirectory;
+  if (!workingDirectory.enter(directory, err))
+    return std::nullopt;
+  return runTar(members, archive, err);
 }
 
 bool PatchProcessor::runTar(const std::vector<std::string> &members, const std::string &archive,

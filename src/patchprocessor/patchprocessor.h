@@ -7,6 +7,7 @@
 
 #include <map>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -101,10 +102,10 @@ private:
   PatchProcessor(const std::string &patchFilePath, const std::string &home);
 
   PatchFileName patchFileName() const;
-  std::string tempDir() const;
-  std::string sourceRoot() const;
+  std::string tempDir() const;    ///< where the archive is extracted
+  std::string contentDir() const; ///< where its commands and files are looked for
 
-  bool enterTempDir(std::string &archive, std::string &previousDirectory, PatchError *err);
+  std::optional<bool> unpack(const std::vector<std::string> &members, PatchError *err);
   bool runTar(const std::vector<std::string> &members, const std::string &archive, PatchError *err);
   bool verifyPrereqs(PatchError *err);
   bool verifyLevel(const ORVComponent &installed, PatchError *err);
@@ -116,9 +117,7 @@ private:
   bool stopListed(const std::vector<std::string> &codes, PatchError *err);
   bool startInstances(PatchError *err);
   void writeResultFile(int resultCode) const;
-  bool runIfAny(const std::vector<std::string> &commands, PatchError *err);
-  bool runCommands(const std::vector<std::string> &commands, PatchError *err);
-  bool listTree(PatchError *err);
+  bool runList(const std::vector<std::string> &commands, PatchError::Code code, PatchError *err);
 
   std::string patchFilePath_;
   std::string home_;

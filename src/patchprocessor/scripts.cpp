@@ -1,9 +1,11 @@
 // The commands of a patch, run at three fixed points from the extracted archive.
 #include "patchprocessor/patchprocessor.h"
 
+#include <algorithm>
 #include <cstdlib>
 
 #include "failure.h"
+#include "patchprocessor/workingdirectory.h"
 #include "process.h"
 #include "utilities.h"
 
@@ -33,18 +35,10 @@ private:
   std::string oldPath_;
 };
 
-/// KEEP(script-code-replaced): the code of a failed list is that of its place in the sequence, whatever the
-/// reason; the text stays.
-bool withCode(PatchError::Code code, bool result, PatchError *err) {
-  if (!result && err != nullptr)
-    err->code = code;
-  return result;
-}
-
 /// Runs one command.
 /// KEEP(command-is-program): the whole text is the name of the program, blanks included; no shell interprets
 /// it.
-bool runScript(const std::string &command, PatchError *err) {
+bool execute(const std::string &command, PatchError *err) {
   LOG_INFO_MESSAGE("PP_PROCESS_SCRIPT", command.c_str());
   CommandResult script;
   if (!runCommand({command}, script))
@@ -65,50 +59,49 @@ bool runScript(const std::string &command, PatchError *err) {
 
 bool PatchProcessor::runPrePatchScripts(PatchError *err) {
   LOG_TRACE("PatchProcessor::runPrePatchScripts() %s", "entry");
-  const bool result =
-      withCode(PatchError::PrePatchScriptFailed, runIfAny(descriptor_->getPrePatchCommands(), err), err);
+  const bool result = runList(descriptor_->getPrePatchCommands(), PatchError::PrePatchScriptFailed, err);
   LOG_TRACE("PatchProcessor::runPrePatchScripts() = %d", result);
   return result;
 }
 
 bool PatchProcessor::runPreScripts(PatchError *err) {
   LOG_TRACE("PatchProcessor::runPreScripts() %s", "entry");
-  const bool result =
-      withCode(PatchError::PreScriptFailed, runIfAny(descriptor_->getPreCommands(), err), err);
+  const bool result = runList(descriptor_->getPreCommands(), PatchError::PreScriptFailed, err);
   LOG_TRACE("PatchProcessor::runPreScripts() = %d", result);
   return result;
 }
 
 bool PatchProcessor::runPostScripts(PatchError *err) {
   LOG_TRACE("PatchProcessor::runPostScripts() %s", "entry");
-  const bool result =
-      withCode(PatchError::PostScriptFailed, runIfAny(descriptor_->getPostCommands(), err), err);
+  const bool result = runList(descriptor_->getPostCommands(), PatchError::PostScriptFailed, err);
   LOG_TRACE("PatchProcessor::runPostScripts() %d", result);
   return result;
 }
 
-bool PatchProcessor::runIfAny(const std::vector<std::string> &commands, PatchError *err) {
-  return commands.empty() || runScripts(commands, err);
+/// KEEP(script-code-replaced): the code of a failed list is that of its place in the sequence, whatever the
+/// reason; the text stays.
+bool PatchProcessor::runList(const std::vector<std::string> &commands, PatchError::Code code,
+                             PatchError *err) {
+  const bool result = commands.empty() || runScripts(commands, err);
+  if (!result && err != nullptr)
+    err->code = code;
+  return result;
 }
 
 bool PatchProcessor::runScripts(std::vector<std::string> commands, PatchError *err) {
   LOG_TRACE("PatchProcessor::runScripts() %s", "entry");
-  const bool result = runCommands(commands, err);
+  bool result = false;
+  { // the search path is restored before the result is traced
+    const std::string directory = contentDir();
+    const PathWith path(directory);
+    WorkingDirectory workingDirectory;
+    if (workingDirectory.enter(directory, err)) {
+      LOG_INFO_MESSAGE("PP_SCRIPT_COUNT", static_cast<int>(commands.size()));
+      result = std::all_of(commands.begin(), commands.end(),
+                           [err](const std::string &command) { return execute(command, err); });
+      result = workingDirectory.leave(err) && result;
+    }
+  }
   LOG_TRACE("PatchProcessor::runScripts() = %d", result);
-  return result;
-}
-
-bool PatchProcessor::runCommands(const std::vector<std::string> &commands, PatchError *err) {
-  const std::string previousDirectory = Util::getCurrentDirectory();
-  const std::string directory = Util::getTempDir(descriptor_->getProductCode());
-  const PathWith path(directory);
-  if (!Util::setCurrentDirectory(directory))
-    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", directory.c_str());
-  LOG_INFO_MESSAGE("PP_SCRIPT_COUNT", static_cast<int>(commands.size()));
-  bool result = true;
-  for (std::size_t i = 0; result && i < commands.size(); ++i)
-    result = runScript(commands[i], err);
-  if (!Util::setCurrentDirectory(previousDirectory))
-    result = FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", previousDirectory.c_str());
   return result;
 }
