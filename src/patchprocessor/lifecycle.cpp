@@ -91,6 +91,9 @@ std::string PatchProcessor::tempDir() const {
 
 std::string PatchProcessor::contentDir() const {
   return Util::getTempDir(descriptor_->getProductCode());
+// KEEP(two-temp-directories): one would expect tempDir() here too. A patch whose file name and descriptor
+// name different products is extracted into the directory of the one, and its commands and files are looked
+// for in that of the other.
 }
 
 bool PatchProcessor::initialize(PatchError *err) {

@@ -151,6 +151,7 @@ TEST_F(FileInstallTest, EmptyDirectoriesAreMade) {
   EXPECT_TRUE(fs::is_directory(home() + "a/b"));
 }
 
+// KEEP(two-temp-directories)
 TEST_F(FileInstallTest, SourceIsThatOfTheDescriptorsProduct) {
   bring("bin/agent");
   expectMoves(loaded("KXE_lpp266_vema_fp0001.tar", patchIni("KXE")));

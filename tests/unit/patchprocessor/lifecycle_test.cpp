@@ -199,6 +199,7 @@ TEST_F(LifecycleTest, DescriptorThatIsReadAgainReplacesTheOneOfBefore) {
   EXPECT_EQ(kxe->getDescriptor(), nullptr);
 }
 
+// KEEP(two-temp-directories)
 TEST_F(LifecycleTest, TemporaryDirectoryIsThatOfTheFileNameAlsoWhenTheDescriptorIsOfAnother) {
   const Processor kxe = loaded(PatchName, patchIni("kyn"));
   write("tmp/kyn/mine", "");

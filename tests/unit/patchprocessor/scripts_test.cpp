@@ -89,6 +89,7 @@ TEST_F(ScriptsTest, CommandOfThePatchHidesAProgramOfTheSystem) {
   EXPECT_EQ(journal(), Names{"own ls"});
 }
 
+// KEEP(two-temp-directories)
 TEST_F(ScriptsTest, TemporaryDirectoryIsThatOfTheDescriptorsProduct) {
   const Processor other = loaded("KXE_lpp266_vema_fp0001.tar", patchIni("KXE"));
   bring(command("1.sh", "found"));
