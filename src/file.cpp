@@ -159,8 +159,8 @@ void File::initialize() {
   // then empty, does not exist for this class.
   const bool slash = endsInSlash(path_);
   struct stat status = {};
-  // Two pointers: with two strings the conditional would make a copy for every file.
-  if (stat(slash ? path_.substr(0, path_.size() - 1).c_str() : path_.c_str(), &status) != 0) {
+  const std::string name = slash ? path_.substr(0, path_.size() - 1) : path_;
+  if (stat(name.c_str(), &status) != 0) {
     const int error = errno;
     if (error != ENOENT && error != ENOTDIR)
       LOG_ERROR("Unable to determine file/directory for path: %s. %s", path_.c_str(), strerror(error));
@@ -170,8 +170,8 @@ void File::initialize() {
   isDirectory_ = S_ISDIR(status.st_mode);
   isFile_ = !isDirectory_;
   isRegular_ = S_ISREG(status.st_mode);
-  // A path with a status is accessible too, unless the "/" that was left out requires a directory. A call of
-  // access for each snapshot would take a twentieth of a large installation's time.
+  // A path with a status is accessible too, unless the "/" that was left out requires a directory. This saves
+  // a call of access for each snapshot.
   exists_ = isDirectory_ || !slash;
   lastModification_ = static_cast<std::int32_t>(status.st_mtime);
   size_ = static_cast<std::int32_t>(status.st_size);

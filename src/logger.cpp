@@ -1,11 +1,9 @@
 #include "logger.h"
 
 #include <algorithm>
-#include <charconv>
 #include <cstdio>
 #include <cstdlib>
 #include <ctime>
-#include <iterator>
 #include <string_view>
 #include <utility>
 
@@ -22,7 +20,7 @@ int glbCurLine = 0;
 
 namespace {
 
-constexpr std::string_view levelWords[] = {"ERROR ", "INFO  ", "TRACE "};
+constexpr const char *levelWords[] = {"ERROR", "INFO ", "TRACE"};
 
 // Almost every line fits; a longer one is formatted once more into a string of its size.
 constexpr std::size_t LineSize = 2048;
@@ -59,8 +57,8 @@ void writeHeader() {
   writeText(header.data(), header.size());
 }
 
-/// A second and its text, shared by the thousands of lines of one second: the two conversions would take a
-/// fiftieth of a large installation's time. The zone does not change after logInit.
+/// A second and its text, shared by the thousands of lines of one second. The zone does not change after
+/// logInit.
 struct Clock {
   time_t second = -1;
   char text[16] = "";
@@ -69,7 +67,7 @@ struct Clock {
 Clock lineClock;
 
 // "HH:MM:SS" in local time; empty when it cannot be determined. localtime_r, unlike localtime, does not check
-// the time-zone file for every line, which would take a fifth of a large installation's time.
+// the time-zone file for every line.
 const char *currentTime() {
   const time_t now = time(nullptr);
   if (now == lineClock.second)
@@ -79,26 +77,6 @@ const char *currentTime() {
   if (localtime_r(&now, &local) != nullptr)
     static_cast<void>(strftime(lineClock.text, sizeof lineClock.text, "%H:%M:%S", &local));
   return lineClock.text;
-}
-
-/// Fills in the start of a line, "LEVEL HH:MM:SS (component,line): ", piece by piece: snprintf would take a
-/// fiftieth of a large installation's time. Returns its length.
-std::size_t formatPrefix(char *line, logger_level level, const char *component) {
-  char *to = line;
-  const auto append = [&to, end = line + LineSize - 1](std::string_view piece) {
-    to += piece.copy(to, static_cast<std::size_t>(end - to));
-  };
-  char number[12];
-  const char *const numberEnd = std::to_chars(number, std::end(number), glbCurLine).ptr;
-
-  append(levelWords[level]);
-  append(currentTime());
-  append(" (");
-  append(component);
-  append(",");
-  append({number, static_cast<std::size_t>(numberEnd - number)});
-  append("): ");
-  return static_cast<std::size_t>(to - line);
 }
 
 } // namespace
@@ -128,7 +106,9 @@ void setLine(int line) {
 
 void logMsg(logger_level level, const char *component, const char *format, va_list arguments) {
   char line[LineSize];
-  const std::size_t used = formatPrefix(line, level, component);
+  const int prefix =
+      snprintf(line, sizeof line, "%s %s (%s,%d): ", levelWords[level], currentTime(), component, glbCurLine);
+  const auto used = static_cast<std::size_t>(std::clamp(prefix, 0, static_cast<int>(LineSize) - 1));
 
   va_list again;
   va_copy(again, arguments);

@@ -23,15 +23,17 @@ void printCommands(const std::vector<std::string> &commands, const char *heading
 
 bool PatchProcessor::run(PatchError *err) {
   LOG_TRACE("PatchProcessor::run() %s", "entry");
-  bool result = extract(err)                  //
-                && runPrePatchScripts(err)    //
-                && stopDependents(err)        //
-                && runPreScripts(err)         //
-                && moveFiles(err)             //
-                && updateProductEXEFiles(err) //
-                && runPostScripts(err)        //
-                && updatePatchVerFile(err)    //
+  // clang-format off
+  bool result = extract(err)
+                && runPrePatchScripts(err)
+                && stopDependents(err)
+                && runPreScripts(err)
+                && moveFiles(err)
+                && updateProductEXEFiles(err)
+                && runPostScripts(err)
+                && updatePatchVerFile(err)
                 && startDependents(err);
+  // clang-format on
   if (!startOSAgentIfNeeded(err == nullptr ? 0 : err->code, err)) {
     // KEEP(osagent-wording): the line says so even when an earlier step has failed already.
     LOG_TRACE("Patch seems to be successfully applied. However, the OS agent could not be restarted");
@@ -89,11 +91,11 @@ std::string PatchProcessor::tempDir() const {
   return Util::getTempDir(patchFileName().getProduct());
 }
 
-std::string PatchProcessor::contentDir() const {
-  return Util::getTempDir(descriptor_->getProductCode());
 // KEEP(two-temp-directories): one would expect tempDir() here too. A patch whose file name and descriptor
 // name different products is extracted into the directory of the one, and its commands and files are looked
 // for in that of the other.
+std::string PatchProcessor::contentDir() const {
+  return Util::getTempDir(descriptor_->getProductCode());
 }
 
 bool PatchProcessor::initialize(PatchError *err) {
