@@ -5,12 +5,14 @@
 #include <filesystem>
 #include <memory>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
+#include "logger.h"
 #include "patchhome.h"
 
 namespace {
@@ -136,6 +138,28 @@ TEST_F(LoadTest, PathThatDoesNotExistIsCode30) {
   EXPECT_EQ(expectLoadFails(home() + "missing", {30, message}),
             aroundLoading(home() + "missing", {dcfError(message)}, false));
 }
+
+/// What stands in the place of a patch when it is looked at again.
+class ExchangedPatchTest : public LoadTest, public ::testing::WithParamInterface<bool> {};
+
+TEST_P(ExchangedPatchTest, EndsTheCommandAndIsNotLeftOut) {
+  const std::string exchanged = makeAgentPatch("xe");
+  makeAgentPatch("yn");
+  const LogSink before = setLogSink([&exchanged, becomesDirectory = GetParam()](std::string_view line) {
+    if (line.find("Processing patch file: kxe_") == std::string_view::npos)
+      return;
+    fs::remove(exchanged);
+    if (becomesDirectory)
+      fs::create_directory(exchanged);
+  });
+  PatchError err;
+  const Package package = load(patches(), &err);
+  static_cast<void>(setLogSink(before));
+  EXPECT_EQ(package, nullptr) << "the other patch alone must not be installed";
+  EXPECT_NE(err.code, PatchError::None);
+}
+
+INSTANTIATE_TEST_SUITE_P(BetweenTwoLooks, ExchangedPatchTest, ::testing::Bool());
 
 TEST_F(LoadTest, WhatIsNeitherFileNorDirectoryLoadsNothingAndSucceeds) {
   const std::string pipe = home() + "kxe_lpp266_vema_fp0001.tar";
