@@ -51,7 +51,8 @@ def test_all_artefacts_and_their_checksums(clone):
     assert (done.returncode, done.stderr) == (0, "")
     version = version_between_releases(clone)
     packages = [name.format(v=version) for architecture in ARCHITECTURES for name in architecture.packages]
-    artefacts = sorted([f"orvpatch-{version}.tar.gz", *packages])
+    collection = "orv-patch-" + re.sub(r"~git(\d+)\.", r"-git\1.c", version) + ".tar.gz"
+    artefacts = sorted([f"orvpatch-{version}.tar.gz", collection, *packages])
     told = sorted([*artefacts, "VERSIONS", f"orvpatch-{version}.spdx.json"])
     assert sorted(path.name for path in (clone / "dist").iterdir()) == sorted(["SHA256SUMS", *told])
 

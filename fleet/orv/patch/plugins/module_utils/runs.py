@@ -141,12 +141,11 @@ class Runs:
                 close_fds=True,
                 start_new_session=True,
             )
-        _write(os.path.join(folder, "pid"), "%d\n" % process.pid)  # the shell's own line may take a moment
-        while not supervises(str(process.pid), folder) and process.poll() is None:
-            time.sleep(0.01)  # a program that was just started has no command line yet
-        self._remove_old()
         run = Run(folder)
+        while not run.is_alive and process.poll() is None and run.status is None:
+            time.sleep(0.01)  # until the shell has written its number
         run.process = process
+        self._remove_old()
         return run
 
     def _all(self):
