@@ -5,6 +5,7 @@ from __future__ import absolute_import, division, print_function
 __metaclass__ = type
 
 import json
+from contextlib import contextmanager
 
 from ansible_collections.orv.patch.plugins.module_utils import ctl, runs, transactions
 
@@ -16,6 +17,7 @@ class Transacting:
         self.module = module
         self.program = ctl.Ctl(module)
         self.runs = runs.Runs(module.params["state_dir"], self.program.home)
+        self.waited_for = None  # a run that another module had started
 
     def execute(self, work):
         """Calls `work`, and tells the engine what stops it."""
@@ -27,28 +29,33 @@ class Transacting:
             self.module.exit_json(changed=True, msg="the connection was lost; the run goes on")
 
     def earlier(self, job):
-        """The run of the same job that no module has told yet, when it has ended; None when there is none. A run of
-        another job is waited for, and left alone."""
-        run = self.runs.find()
+        """The ended run of the same job that no module has told yet, or that this one has waited for; None when there
+        is none. A run of another job is left alone."""
+        run = self.waited_for or self.runs.find()
         if run is None:
             return None
-        self.wait(run)
         if same_job(run.job, job):
             return run
         self.module.warn("an earlier run was waited for: %s" % outcome(run))
         run.tell()
         return None
 
-    def run(self, job, words):
-        """Starts the job, or finds it at work, and waits for its end."""
-        with self.runs.locked():
-            run = self.runs.find()
-            if run is None or not run.is_alive:
-                run = self.runs.start(job, [self.program.program] + words + ["--json"])
-        self.wait(run)
-        if not same_job(run.job, job):
-            self.fail("another run is at work on the home", verdict="refused")
-        return run
+    @contextmanager
+    def alone(self):
+        """Waits for the runs at work on the home. Inside, no other module starts one, nor checks: a check while another
+        controller's installation begins would refuse the home, or make that one refuse it."""
+        while True:
+            with self.runs.locked():
+                run = self.runs.find()
+                if run is None or not run.is_alive:
+                    yield
+                    return
+            self.wait(run)
+            self.waited_for = run
+
+    def start(self, job, words):
+        """Starts the job; `wait` waits for its end."""
+        return self.runs.start(job, [self.program.program] + words + ["--json"])
 
     def wait(self, run):
         if not run.wait(self.module.params["timeout"], runs.is_listened):

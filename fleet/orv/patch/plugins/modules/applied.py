@@ -178,16 +178,24 @@ class Applying:
         self._demand_digests([one["file"] for one in shown])
         found = dict((one["file"], sha256(self._path_of(one["file"]))) for one in shown)
         job = {"action": "apply", "digests": found}
+        with self.transacting.alone():
+            run = self._begin(job, shown)
+        self.transacting.wait(run)
+        self._tell(run, resumed=False)
+
+    def _begin(self, job, shown):
+        """Starts the run, unless there is nothing to do, or an earlier one has something to tell."""
         run = self.transacting.earlier(job)
         status = self.program.status()
         if transactions.in_place(shown, status, self.program.history()):
-            self._unchanged(run, status, found)
+            self._unchanged(run, status, job["digests"])
         if run is not None:
             self._tell_bad_end(run)
         if self.module.check_mode:
             self._check()
-        run = self.transacting.run(job, ["apply", self.program.home, self.patch, "--yes"] + self._options())
-        self._tell(run, resumed=False)
+        return self.transacting.start(
+            job, ["apply", self.program.home, self.patch, "--yes"] + self._options()
+        )
 
     def _demand_digests(self, patches):
         wanted = self.module.params["digests"]

@@ -96,6 +96,13 @@ class Undoing:
         self.home = self.transacting.program.home
 
     def work(self):
+        with self.transacting.alone():
+            run, target = self._begin()
+        self.transacting.wait(run)
+        self._tell(run, target, False)
+
+    def _begin(self):
+        """Starts the undo of a transaction, unless there is nothing to do, or an earlier one has something to tell."""
         self._finish_earlier()
         kept = transactions.records(self.home)
         target = self._choose(transactions.applications(kept))
@@ -104,7 +111,7 @@ class Undoing:
         if self.module.check_mode:
             self._succeed(True, "undone", target, target)
         job = {"action": "undo", "transaction": target["id"]}
-        self._tell(self.transacting.run(job, ["undo", self.home, target["id"]]), target, False)
+        return self.transacting.start(job, ["undo", self.home, target["id"]]), target
 
     def _finish_earlier(self):
         """An undo that was cut off is waited for, and told."""
