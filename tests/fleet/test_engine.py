@@ -156,6 +156,18 @@ def test_the_version_is_the_one_of_all_packages():
     ).group(1)
     assert f"\nversion: {announced}\n" in (COLLECTION / "galaxy.yml").read_text()
     assert f"\n## {announced}\n" in (COLLECTION / "CHANGELOG.md").read_text()
+    for page in (CHECKOUT / "README.md", COLLECTION / "README.md"):
+        assert f"ansible-galaxy collection install orv-patch-{announced}.tar.gz\n" in page.read_text()
+
+
+def test_the_example_of_an_inventory_gives_every_host_a_home(place):
+    example = CHECKOUT / "fleet/inventory.example.yml"
+    run(place, "yamllint", "--strict", "-d", "relaxed", example)
+    hosts = json.loads(run(place, "ansible-inventory", "-i", example, "--list"))["_meta"]["hostvars"]
+    assert {name: one["fixpack_home"] for name, one in hosts.items()} == {
+        "monitor1.example.com": "/opt/orv",
+        "monitor2.example.com": "/srv/orv",
+    }
 
 
 DOCUMENTED = {
