@@ -1,7 +1,9 @@
 """The role in a play of one's own, by a local connection."""
 
 import json
+import os
 import re
+import subprocess
 
 import pytest
 
@@ -78,3 +80,42 @@ def test_a_patch_that_its_checksums_do_not_list_so_does_not_leave_the_controller
 def test_a_role_without_a_home_is_told_what_is_missing(play):
     status, printed, _ = play(fixpack_keep="many")
     assert status == 2 and "fixpack_keep" in printed
+
+
+@pytest.fixture
+def sign(scratch, patch_dir):
+    """sign() lists the patches in SHA256SUMS and signs that; `sign.keyring` has the key."""
+    folder = scratch / "gnupg"
+    folder.mkdir(mode=0o700)
+    environment = {**os.environ, "GNUPGHOME": str(folder)}
+
+    def gpg(*words):
+        command = ["gpg", "--batch", "-q", *words]
+        return subprocess.run(
+            command, env=environment, cwd=patch_dir, check=True, stdout=subprocess.PIPE
+        ).stdout
+
+    def make():
+        (patch_dir / "SHA256SUMS.asc").unlink(missing_ok=True)
+        subprocess.run("sha256sum *.tar >SHA256SUMS", shell=True, cwd=patch_dir, check=True)
+        gpg("--armor", "--detach-sign", "SHA256SUMS")
+
+    gpg("--passphrase", "", "--quick-gen-key", "maker@example", "ed25519", "sign")
+    make.keyring = scratch / "keyring.gpg"
+    make.keyring.write_bytes(gpg("--export"))
+    yield make
+    subprocess.run(["gpgconf", "--kill", "all"], env=environment, check=False)
+
+
+def test_only_a_signed_patch_gets_in_where_a_keyring_is_set(play, home, patch_dir, sign):
+    sign()
+    signature = (patch_dir / "SHA256SUMS.asc").read_bytes()
+    Patch("yn", level="06100200").file("lib/new", "foreign\n").write(patch_dir)
+    sign()
+    (patch_dir / "SHA256SUMS.asc").write_bytes(signature)  # of the patch that was there before
+    status, printed, _ = play(fixpack_keyring=str(sign.keyring), fixpack_require_sums=True)
+    assert status == 2 and "refused: signature-bad" in printed
+    assert home.history() == []
+    sign()
+    assert play(fixpack_keyring=str(sign.keyring), fixpack_require_sums=True)[0] == 0
+    assert home.read("lib/new") == b"foreign\n"

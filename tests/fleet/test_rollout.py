@@ -210,7 +210,9 @@ def test_two_controllers_at_once_patch_each_home_once(fleet):
     release(host)
     printed = [one.communicate(timeout=900)[0] for one in (first, second)]
     reports = [fleet.report(fixpack_report_name=name) for name in ("first", "second")]
-    assert (first.returncode, second.returncode) == (0, 0), [report["reasons"] for report in reports] + printed
+    assert (first.returncode, second.returncode) == (0, 0), [
+        report["reasons"] for report in reports
+    ] + printed
     for name in numbered(ALL, ""):
         assert {report["verdicts"][name] for report in reports} <= {"applied", "unchanged"}
     assert fleet.attempts() == numbered(ALL, ["PASS"])
