@@ -154,13 +154,15 @@ def test_which_verdicts_stop_a_rollout(part):
 
 def test_what_no_batch_has_reached_is_untouched_in_a_rollout(part):
     entries = [
-        {"verdict": "checked", "reason": "", "batch": 0},
-        {"verdict": "refused", "reason": "backlevel", "batch": 0},
-        {"verdict": "applied", "reason": "", "batch": 1},
+        {"verdict": "checked", "reason": "", "batch": 0, "components": [{}]},
+        {"verdict": "refused", "reason": "backlevel", "batch": 0, "components": [{}]},
+        {"verdict": "applied", "reason": "", "batch": 1, "components": [{}]},
+        {"verdict": "untouched", "reason": "", "batch": 0, "components": [{}]},
+        {"verdict": "untouched", "reason": "", "batch": 0, "components": []},
     ]
     for rollout, verdicts in (
-        (True, ["untouched", "refused", "applied"]),
-        (False, ["checked", "refused", "applied"]),
+        (True, ["untouched", "refused", "applied", "untouched", "untouched"]),
+        (False, ["checked", "refused", "applied", "unchanged", "untouched"]),
     ):
         made = part("filter.fleet").document(entries, ["a.tar"], "then", "now", rollout)
         assert [one["verdict"] for one in made["fleet"]] == verdicts

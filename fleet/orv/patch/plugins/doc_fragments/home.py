@@ -29,8 +29,8 @@ options:
   state_dir:
     description:
       - A directory of the user alone, in which the output of running transactions is kept.
-      - It is made when it is missing. All users of a home must use the same one, to find a run that another
-        connection started.
+      - It is made when it is missing. A run is found again by the user who started it; for other users the home is
+        locked until the run ends.
     type: path
     default: ~/.orv_patch/runs
   timeout:

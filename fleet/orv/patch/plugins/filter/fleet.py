@@ -100,14 +100,19 @@ def is_bad(made, undoing=False):
 
 
 def document(entries, patches, started, ended, rollout):
-    """The document. In a rollout, a host that no batch has reached is untouched, whatever its check said."""
-    shown = [
-        dict(made, verdict="untouched", reason="")
-        if rollout and not made["batch"] and not is_bad(made)
-        else made
-        for made in entries
-    ]
+    """The document of all entries."""
+    shown = [dict(made, **last_word(made, rollout)) for made in entries]
     return {"fleet": shown, "patches": patches, "started": started, "ended": ended}
+
+
+def last_word(made, rollout):
+    """In a rollout, a host that no batch has reached is untouched, whatever its check said. Elsewhere, a home that was
+    read, and with which there was nothing to do, is unchanged."""
+    if rollout and not made["batch"] and not is_bad(made):
+        return {"verdict": "untouched", "reason": ""}
+    if not rollout and made["verdict"] == "untouched" and made["components"]:
+        return {"verdict": "unchanged"}
+    return {}
 
 
 class FilterModule:
