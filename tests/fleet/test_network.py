@@ -1,5 +1,7 @@
 """The hosts of the tests themselves: apart from one another, and reached by real connections."""
 
+import pytest
+
 from network import HOME, PROGRAMS
 
 
@@ -21,6 +23,7 @@ def test_each_host_is_one_of_its_own(network):
     assert [name for name, answer in shown.items() if "own" in answer["stdout"].split()] == ["host1"]
 
 
+@pytest.mark.full
 def test_the_programs_work_on_a_host(network):
     command = f"{PROGRAMS}/orvpatchctl status {HOME}"
     answers = network.controller.modules("host1:host8", "ansible.builtin.command", command)
@@ -29,6 +32,7 @@ def test_the_programs_work_on_a_host(network):
         assert "east" in answer["stdout"] and "06.10.00.00" in answer["stdout"]
 
 
+@pytest.mark.full
 def test_a_connection_can_be_cut(network):
     host = network.hosts[2]
     host.unplug()
