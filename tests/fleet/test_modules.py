@@ -411,9 +411,7 @@ def test_a_failure_behind_a_lost_connection_is_told_once(modules, ready, patch_d
     assert len(home.history()) == 2
 
 
-def test_what_was_taken_back_by_hand_meanwhile_is_applied_anew(
-    modules, ready, patch_dir, ctl_binary, program
-):
+def test_what_was_taken_back_by_hand_meanwhile_is_applied_anew(modules, ready, patch_dir):
     home, path = ready, held_up().write(patch_dir)
     cut_off(modules, home, path)
     open_gate(home)
