@@ -220,6 +220,19 @@ def test_a_file_that_is_not_the_listed_one_does_not_go(source, patch_dir):
         source()
 
 
+def test_what_is_a_patch_is_told_by_the_name(part):
+    is_patch = part("lookup.source").is_patch
+    assert is_patch(NAME) and is_patch(f"{NAME}.sha256")
+    for name in (
+        "readme.txt",
+        "SHA256SUMS",
+        "how_to_install_it.txt",
+        "kyn_lpp266_vemx_fp0002.tar",
+        f"old_{NAME}",
+    ):
+        assert not is_patch(name)
+
+
 def test_sums_can_be_required(source, patch_dir):
     from ansible.errors import AnsibleLookupError
 

@@ -63,6 +63,7 @@ from ansible.plugins.lookup import LookupBase
 
 SUMS = "SHA256SUMS"
 COMPANIONS = (SUMS, SUMS + ".asc")
+KINDS = ("vema", "vems", "veps", "vepd", "vecm")
 
 
 class LookupModule(LookupBase):
@@ -102,8 +103,9 @@ def chosen(path):
 
 
 def is_patch(name):
-    """By the name alone, as the installer decides: product_platform_kind_fixpack with anything behind."""
-    return name.count("_") == 3 and name not in COMPANIONS
+    """By the name alone, as the installer decides: product_platform_kind_fixpack, with anything behind."""
+    parts = name.split("_")
+    return len(parts) == 4 and len(parts[0]) == 3 and parts[2] in KINDS
 
 
 def described(path):
