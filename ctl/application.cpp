@@ -1,5 +1,6 @@
 #include "application.h"
 
+#include <csignal>
 #include <cstdio>
 #include <new>
 
@@ -54,6 +55,9 @@ int parseAndRun(int argc, const char *const *argv) {
   } catch (const std::bad_alloc &) {
     fputs("orvpatchctl: out of memory\n", stderr);
     return CannotJudge;
+  } catch (const std::exception &error) { // of the library: a directory that cannot be read, say
+    fprintf(stderr, "orvpatchctl: %s\n", error.what());
+    return CannotJudge;
   }
   return invocation.status;
 }
@@ -61,6 +65,8 @@ int parseAndRun(int argc, const char *const *argv) {
 } // namespace
 
 int runApplication(int argc, const char *const *argv) {
+  // With SIGCHLD ignored, which a caller may leave behind, children have no exit status.
+  static_cast<void>(signal(SIGCHLD, SIG_DFL));
   const int status = parseAndRun(argc, argv);
   // A document that a full disk has cut off must not pass for a whole one.
   if (fflush(stdout) == 0 && ferror(stdout) == 0)

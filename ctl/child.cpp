@@ -20,6 +20,10 @@
 
 namespace {
 
+[[noreturn]] void cannotReadOutput() {
+  throw JudgementError(std::string("cannot read the output of a program: ") + strerror(errno));
+}
+
 /// A file in memory that a child writes to.
 class Capture {
 public:
@@ -34,14 +38,18 @@ public:
   int fd() const { return fd_; }
   std::string text() const {
     struct stat status = {};
-    std::string content(fstat(fd_, &status) == 0 ? static_cast<std::size_t>(status.st_size) : 0, '\0');
+    if (fstat(fd_, &status) != 0)
+      cannotReadOutput();
+    std::string content(static_cast<std::size_t>(status.st_size), '\0');
     std::size_t filled = 0;
     while (filled < content.size()) {
       const ssize_t count =
           pread(fd_, content.data() + filled, content.size() - filled, static_cast<off_t>(filled));
-      if (count <= 0)
+      if (count == 0)
         break;
-      filled += static_cast<std::size_t>(count);
+      if (count < 0 && errno != EINTR)
+        cannotReadOutput();
+      filled += count < 0 ? 0 : static_cast<std::size_t>(count);
     }
     content.resize(filled);
     return content;
@@ -114,14 +122,15 @@ bool endsWithin(pid_t child, std::chrono::seconds limit) {
   const auto end = std::chrono::steady_clock::now() + limit;
   auto pause = std::chrono::microseconds(200);
   siginfo_t info = {};
-  while (waitid(P_PID, static_cast<id_t>(child), &info, WEXITED | WNOWAIT | WNOHANG) == 0 &&
-         info.si_pid == 0) {
+  for (;;) {
+    const int result = waitid(P_PID, static_cast<id_t>(child), &info, WEXITED | WNOWAIT | WNOHANG);
+    if (result == 0 ? info.si_pid != 0 : errno != EINTR)
+      return true;
     if (std::chrono::steady_clock::now() > end || wasInterrupted())
       return false;
     std::this_thread::sleep_for(pause);
     pause = std::min(2 * pause, std::chrono::microseconds(20000));
   }
-  return true;
 }
 
 /// 0, or why the program was not started.
@@ -185,7 +194,7 @@ bool BackgroundChild::hasEnded(int milliseconds) {
   for (int waited = 0; child_ != 0; waited += 10) {
     int status = 0;
     const pid_t ended = waitpid(child_, &status, WNOHANG);
-    if (ended != 0) {
+    if (ended != 0 && !(ended < 0 && errno == EINTR)) {
       status_ = ended < 0 ? 127 : exitStatus(status);
       child_ = 0;
     } else if (waited >= milliseconds) {

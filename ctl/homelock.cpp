@@ -13,11 +13,15 @@ HomeLock::HomeLock(const std::string &home) : directory_(home.c_str(), O_RDONLY 
   if (!directory_.isOpen())
     throw JudgementError("cannot open " + home + ": " + strerror(errno));
   held_ = flock(directory_.get(), LOCK_EX | LOCK_NB) == 0;
+  if (!held_ && errno != EWOULDBLOCK)
+    throw JudgementError("cannot lock " + home + ": " + strerror(errno));
 }
 
 bool isHomeLocked(const std::string &home) {
   const FileDescriptor directory(home.c_str(), O_RDONLY | O_DIRECTORY);
-  if (!directory.isOpen() || flock(directory.get(), LOCK_SH | LOCK_NB) == 0)
+  if (directory.isOpen() && flock(directory.get(), LOCK_SH | LOCK_NB) == 0)
     return false;
-  return errno == EWOULDBLOCK;
+  if (errno != EWOULDBLOCK)
+    throw JudgementError("cannot look for a lock on " + home + ": " + strerror(errno));
+  return true;
 }

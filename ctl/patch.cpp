@@ -8,6 +8,7 @@
 
 #include "file.h"
 #include "judgement.h"
+#include "look.h"
 #include "memoryfile.h"
 #include "target.h"
 
@@ -35,6 +36,11 @@ public:
 private:
   int fd_;
 };
+
+bool isDirectory(const std::string &path) {
+  const std::optional<struct stat> status = lookBehind(path);
+  return status && S_ISDIR(status->st_mode);
+}
 
 std::size_t rankOf(const std::string &path) {
   return targetOrder(PatchFileName(File(path).getName()).getTarget());
@@ -69,15 +75,17 @@ Patch readPatch(const std::string &path) {
 }
 
 std::vector<std::string> patchFiles(const std::string &path) {
-  File given(path);
-  if (!given.exists())
+  const std::optional<struct stat> given = lookBehind(path);
+  if (!given)
     throw JudgementError("cannot read " + path);
-  if (!given.isDirectory())
+  if (!S_ISDIR(given->st_mode))
     return {path};
+  const std::string top = path.back() == '/' ? path : path + "/";
   std::vector<std::string> files;
-  for (const File *file : *given.listFiles())
-    if (PatchFileName(file->getName()).isValid())
-      files.push_back(file->getPath());
+  listDirectory(path, [&](const std::string &name) {
+    if (PatchFileName(name).isValid() && !isDirectory(top + name))
+      files.push_back(top + name);
+  });
   if (files.empty())
     throw JudgementError("no patch in " + path);
   std::stable_sort(files.begin(), files.end(),

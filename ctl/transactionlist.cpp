@@ -1,13 +1,15 @@
 #include "transactionlist.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <cstring>
 
 #include <nlohmann/json.hpp>
+#include <unistd.h>
 
-#include "file.h"
 #include "inputfile.h"
 #include "judgement.h"
+#include "look.h"
 
 namespace {
 
@@ -60,6 +62,8 @@ std::optional<TransactionSummary> readRecord(const std::string &path) {
   try {
     return summaryOf(Json::parse(InputFile(path).content(LargestRecord), nullptr, false));
   } catch (const JudgementError &) {
+    if (access(path.c_str(), R_OK) == 0)
+      throw;
     return std::nullopt; // closed to this user: the history itself can be told without it
   }
 }
@@ -82,10 +86,13 @@ bool made(const TransactionSummary &transaction, const HistoryRecord &record,
 
 std::vector<TransactionSummary> readTransactions(const std::string &home) {
   std::vector<TransactionSummary> transactions;
-  File folder(home + "patchlogs/transactions");
-  for (const File *entry : *folder.listSubDirectories())
-    if (std::optional<TransactionSummary> summary = readRecord(entry->getPath() + "record.json"))
+  const std::string folder = home + "patchlogs/transactions";
+  if (access(folder.c_str(), R_OK | X_OK) != 0 && errno == EACCES)
+    return transactions;
+  listDirectory(folder, [&](const std::string &name) {
+    if (std::optional<TransactionSummary> summary = readRecord(folder + "/" + name + "/record.json"))
       transactions.push_back(*std::move(summary));
+  });
   std::sort(transactions.begin(), transactions.end(),
             [](const TransactionSummary &a, const TransactionSummary &b) {
               return std::tie(a.started, a.id) < std::tie(b.started, b.id);

@@ -242,13 +242,14 @@ void verifyFiles(const std::string &home, const Patch &patch, std::set<std::stri
   verification.append(found);
 }
 
-void verifyLevel(const std::string &home, const Patch &patch, Verification &verification) {
-  const std::string path = getVerFileName(patch.descriptor.get(), home, patch.path);
-  const std::string shown = path.substr(home.size());
-  const std::string wanted = patch.descriptor->getVersion()->getVersionString();
+void verifyLevel(const std::string &home, const std::string &versionFile, const std::string &wanted,
+                 Verification &verification) {
   std::vector<std::string> lines;
-  if (Util::readFileByLines(path.c_str(), lines) != 0)
-    return verification.add(shown, "level", "the version file cannot be read");
+  const int error = Util::readFileByLines((home + versionFile).c_str(), lines);
+  if (error == ENOENT || error == ENOTDIR)
+    return verification.add(versionFile, "level", "there is no version file");
+  if (error != 0)
+    cannotRead(home + versionFile, error);
   std::size_t levels = 0;
   for (const std::string &line : lines) {
     if (line.rfind("VRMF", 0) != 0)
@@ -256,23 +257,22 @@ void verifyLevel(const std::string &home, const Patch &patch, Verification &veri
     ++levels;
     std::string level = line.substr(line.find('=') == std::string::npos ? 0 : line.find('=') + 1);
     Util::trimString(level);
-    if (level != wanted)
-      verification.add(shown, "level", "the level is " + level + ", the patch brings " + wanted);
+    if (level != Version(wanted).getVersionString())
+      verification.add(versionFile, "level", "the level is " + level + ", the patch brings " + wanted);
   }
   if (levels == 0)
-    verification.add(shown, "level", "the version file has no level");
+    verification.add(versionFile, "level", "the version file has no level");
 }
 
-void verifyHistory(const std::string &home, const Patch &patch, Verification &verification) {
+void verifyHistory(const std::string &home, const HistoryName &patch, Verification &verification) {
   static const char file[] = "patchlogs/patches.hist";
   const std::vector<HistoryRecord> records = readHistory(home).records;
-  const std::string product = patch.descriptor->getProductCode();
   // The history pads the name with blanks, so that blanks at its end cannot be told from padding.
-  std::string name = patch.descriptor->getPatchName();
+  std::string name = patch.name;
   Util::trimString(name);
   const auto last = std::find_if(records.rbegin(), records.rend(), [&](const HistoryRecord &record) {
-    return record.product == product && record.platform == patch.name.getFullPlatform() &&
-           record.target == patch.name.getTarget() && record.name == name;
+    return record.product == patch.product && record.platform == patch.platform &&
+           record.target == patch.target && record.name == name;
   });
   if (last == records.rend())
     verification.add(file, "history", "no line for " + name);
@@ -285,10 +285,16 @@ Verification verifyPatches(const Home &home, const std::vector<Patch> &patches) 
   std::set<std::string> covered;
   std::set<std::string> versionFiles;
   for (std::size_t i = patches.size(); i-- > 0;) {
-    verifyFiles(home.path(), patches[i], covered, found[i]);
-    if (versionFiles.insert(versionFileOf(home, patches[i])).second)
-      verifyLevel(home.path(), patches[i], found[i]);
-    verifyHistory(home.path(), patches[i], found[i]);
+    const Patch &patch = patches[i];
+    const PatchDescriptor &descriptor = *patch.descriptor;
+    verifyFiles(home.path(), patch, covered, found[i]);
+    const std::string versionFile = versionFileOf(home, patch).substr(home.path().size());
+    if (versionFiles.insert(versionFile).second)
+      verifyLevel(home.path(), versionFile, descriptor.getVersion()->getDottedVersionString(), found[i]);
+    verifyHistory(home.path(),
+                  {descriptor.getProductCode(), patch.name.getFullPlatform(), patch.name.getTarget(),
+                   descriptor.getPatchName()},
+                  found[i]);
   }
   Verification all;
   for (const Verification &one : found)

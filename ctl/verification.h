@@ -40,11 +40,20 @@ struct Verification {
 void verifyFiles(const std::string &home, const Patch &patch, std::set<std::string> &covered,
                  Verification &verification);
 
-/// Compares every VRMF line of the version file that the patch rewrites with the patch's level.
-void verifyLevel(const std::string &home, const Patch &patch, Verification &verification);
+/// Compares every VRMF line of a version file, a path of the home, with a level, "06.10.00.02".
+void verifyLevel(const std::string &home, const std::string &versionFile, const std::string &wanted,
+                 Verification &verification);
 
-/// Asks the last history line of this patch (product, platform, target and name) for its result.
-void verifyHistory(const std::string &home, const Patch &patch, Verification &verification);
+/// What the history has of a patch.
+struct HistoryName {
+  std::string product;
+  std::string platform;
+  std::string target;
+  std::string name;
+};
+
+/// Asks the last history line of this patch for its result.
+void verifyHistory(const std::string &home, const HistoryName &patch, Verification &verification);
 
 /// All of it for patches in the installer's order: the last patch of a path or of a version file decides.
 Verification verifyPatches(const Home &home, const std::vector<Patch> &patches);

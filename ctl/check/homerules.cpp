@@ -7,12 +7,13 @@
 #include <cstring>
 #include <filesystem>
 
-#include <dirent.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
 #include "check/hostcheck.h"
 #include "homelock.h"
+#include "judgement.h"
+#include "look.h"
 #include "processes.h"
 
 namespace {
@@ -59,15 +60,15 @@ std::string ownerText(const struct stat &status) {
 
 void checkTmp(HostCheck &check) {
   const std::string path = check.home + "tmp";
-  struct stat status = {};
-  if (lstat(path.c_str(), &status) != 0)
+  const std::optional<struct stat> status = lookAt(path);
+  if (!status)
     return;
-  if (S_ISLNK(status.st_mode))
+  if (S_ISLNK(status->st_mode))
     return check.add("home-tmp", "", "tmp", "it is a symbolic link");
-  if (!S_ISDIR(status.st_mode))
+  if (!S_ISDIR(status->st_mode))
     return check.add("home-tmp", "", "tmp", "it is no directory");
-  if (status.st_uid != geteuid() || (status.st_mode & 0022) != 0)
-    check.add("home-tmp", "", "tmp", ownerText(status));
+  if (status->st_uid != geteuid() || (status->st_mode & 0022) != 0)
+    check.add("home-tmp", "", "tmp", ownerText(*status));
 }
 
 /// The first file below updated_files of a temporary directory that the home lacks; empty when it has them
@@ -77,21 +78,22 @@ std::string onlyCopy(const std::string &home, const std::string &directory) {
   std::error_code error;
   for (fs::recursive_directory_iterator entry(root, error), end; !error && entry != end;
        entry.increment(error)) {
-    struct stat status = {};
     const std::string relative = entry->path().string().substr(root.string().size() + 1);
-    if (!entry->is_directory(error) && lstat((home + relative).c_str(), &status) != 0 && errno == ENOENT)
+    if (!entry->is_directory(error) && !lookAt(home + relative))
       return relative;
   }
+  if (error && error != std::errc::no_such_file_or_directory)
+    throw JudgementError("cannot look through " + root.string() + ": " + error.message());
   return "";
 }
 
 void checkLeftovers(HostCheck &check) {
   for (const std::string &code : check.temporaryCodes()) {
     const std::string directory = check.home + "tmp/" + code;
-    struct stat status = {};
-    if (code.empty() || lstat(directory.c_str(), &status) != 0)
+    const std::optional<struct stat> status = code.empty() ? std::nullopt : lookAt(directory);
+    if (!status)
       continue;
-    const std::string lacking = S_ISDIR(status.st_mode) ? onlyCopy(check.home, directory) : "";
+    const std::string lacking = S_ISDIR(status->st_mode) ? onlyCopy(check.home, directory) : "";
     if (lacking.empty())
       check.add("tmp-leftover", "", "tmp/" + code, "left by an earlier run");
     else
@@ -112,21 +114,21 @@ void checkPatchPlace(HostCheck &check) {
 /// Whether others than root and the runner may change what stands at the path; one that is missing is left
 /// out.
 void checkWriters(HostCheck &check, const char *rule, const std::string &relative) {
-  struct stat status = {};
-  if (stat((check.home + relative).c_str(), &status) != 0)
+  const std::optional<struct stat> status = lookBehind(check.home + relative);
+  if (!status)
     return;
-  const bool foreignOwner = status.st_uid != 0 && status.st_uid != geteuid();
-  if (foreignOwner || (status.st_mode & 0022) != 0)
-    check.add(rule, "", relative, ownerText(status));
+  const bool foreignOwner = status->st_uid != 0 && status->st_uid != geteuid();
+  if (foreignOwner || (status->st_mode & 0022) != 0)
+    check.add(rule, "", relative, ownerText(*status));
 }
 
 void checkRegistryWriters(HostCheck &check) {
   checkWriters(check, "registry-writable", "registry");
-  std::error_code error;
   std::set<std::string> names;
-  for (const fs::directory_entry &entry : fs::directory_iterator(check.home + "registry", error))
-    if (entry.path().extension() == ".ver")
-      names.insert(entry.path().filename());
+  listDirectory(check.home + "registry", [&names](const std::string &name) {
+    if (fs::path(name).extension() == ".ver")
+      names.insert(name);
+  });
   for (const std::string &name : names)
     checkWriters(check, "registry-writable", "registry/" + name);
 }

@@ -14,17 +14,31 @@
 
 #include "check/hostcheck.h"
 #include "filedescriptor.h"
+#include "judgement.h"
+#include "look.h"
 #include "updatedfiles.h"
 
 namespace {
 
 using Size = unsigned long long;
 
+[[noreturn]] void cannotLook(const std::string &path) {
+  throw JudgementError("cannot look at " + path + ": " + strerror(errno));
+}
+
+/// False where the file cannot be opened by this user, or where the file system has no such flags.
 bool isFixed(const std::string &path) {
   const FileDescriptor file(path.c_str(), O_RDONLY | O_NOFOLLOW);
+  if (!file.isOpen() && errno != EACCES && errno != EPERM && errno != ENXIO)
+    cannotLook(path);
   int flags = 0;
-  return file.isOpen() && ioctl(file.get(), FS_IOC_GETFLAGS, &flags) == 0 &&
-         (flags & (FS_IMMUTABLE_FL | FS_APPEND_FL)) != 0;
+  if (!file.isOpen())
+    return false;
+  if (ioctl(file.get(), FS_IOC_GETFLAGS, &flags) == 0)
+    return (flags & (FS_IMMUTABLE_FL | FS_APPEND_FL)) != 0;
+  if (errno != ENOTTY && errno != EOPNOTSUPP && errno != EINVAL && errno != ENOSYS)
+    cannotLook(path);
+  return false;
 }
 
 /// Names of the extended attributes, ACL and capabilities among them. The security label is left out: on a
@@ -32,6 +46,8 @@ bool isFixed(const std::string &path) {
 std::string attributesOf(const std::string &path) {
   char names[4096];
   const ssize_t size = llistxattr(path.c_str(), names, sizeof names);
+  if (size < 0 && errno != EOPNOTSUPP && errno != ERANGE)
+    cannotLook(path);
   std::string text;
   for (const char *name = names; size > 0 && name < names + size; name += strlen(name) + 1)
     if (strcmp(name, "security.selinux") != 0)
@@ -42,17 +58,17 @@ std::string attributesOf(const std::string &path) {
 /// One file that a patch brings, against what has its name in the home now.
 void checkTarget(HostCheck &check, const Patch &patch, const std::string &path) {
   const std::string target = check.home + path;
-  struct stat status = {};
-  if (lstat(target.c_str(), &status) != 0)
+  const std::optional<struct stat> status = lookAt(target);
+  if (!status)
     return;
-  if (S_ISDIR(status.st_mode))
+  if (S_ISDIR(status->st_mode))
     return check.add("target-is-directory", patch.file, path, "a directory of the home has this name");
-  if (S_ISLNK(status.st_mode))
+  if (S_ISLNK(status->st_mode))
     return check.add("target-is-link", patch.file, path, "a symbolic link of the home has this name");
   if (isFixed(target))
     check.add("target-immutable", patch.file, path, "the file is immutable or append-only");
-  if (status.st_nlink > 1)
-    check.add("other-names", patch.file, path, "the file has " + std::to_string(status.st_nlink) + " names");
+  if (status->st_nlink > 1)
+    check.add("other-names", patch.file, path, "the file has " + std::to_string(status->st_nlink) + " names");
   const std::string attributes = attributesOf(target);
   if (!attributes.empty())
     check.add("attributes-lost", patch.file, path, "the file has " + attributes);
@@ -65,8 +81,7 @@ std::string parentOf(const std::string &path) {
 
 /// The directory itself, or the nearest one above it that is there; relative to the home.
 std::string nearestExisting(const std::string &home, std::string directory) {
-  struct stat status = {};
-  while (!directory.empty() && lstat((home + directory).c_str(), &status) != 0)
+  while (!directory.empty() && !lookAt(home + directory))
     directory = parentOf(directory);
   return directory;
 }
@@ -77,8 +92,8 @@ class LinkProbe {
 public:
   explicit LinkProbe(const std::string &home) : home_(home) {
     const std::string name = ".orvpatchctl-probe-source";
-    struct stat status = {};
-    const bool hasTmp = stat((home + "tmp").c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+    const std::optional<struct stat> tmp = lookBehind(home + "tmp");
+    const bool hasTmp = tmp && S_ISDIR(tmp->st_mode);
     source_ = home + (hasTmp ? "tmp/" : "") + name;
     target_ = ".orvpatchctl-probe";
     removeStale(source_);
@@ -147,14 +162,13 @@ Need needOf(const HostCheck &check, const Patch &patch, Size block) {
     const Size bytes =
         member.type == Member::Type::Directory ? block : rounded(static_cast<Size>(member.size), block);
     const std::string path = updatedFilePath(member.name);
-    struct stat old = {};
-    const bool replaces = !path.empty() && lstat((check.home + path).c_str(), &old) == 0;
-    const Size oldBytes = replaces ? static_cast<Size>(old.st_blocks) * 512 : 0;
+    const std::optional<struct stat> old = path.empty() ? std::nullopt : lookAt(check.home + path);
+    const Size oldBytes = old ? static_cast<Size>(old->st_blocks) * 512 : 0;
     need.bytes += bytes;
     need.inodes += 1;
     if (!path.empty()) {
       need.growth += bytes > oldBytes ? bytes - oldBytes : 0;
-      need.newFiles += replaces ? 0 : 1;
+      need.newFiles += old ? 0 : 1;
     }
   }
   return need;
@@ -164,7 +178,7 @@ Need needOf(const HostCheck &check, const Patch &patch, Size block) {
 void checkRoom(HostCheck &check) {
   struct statvfs system = {};
   if (statvfs(check.home.c_str(), &system) != 0)
-    return;
+    cannotLook(check.home);
   const Size block = system.f_frsize == 0 ? 1 : system.f_frsize;
   const Size freeBytes = block * (geteuid() == 0 ? system.f_bfree : system.f_bavail);
   const Size freeInodes = geteuid() == 0 ? system.f_ffree : system.f_favail;

@@ -10,6 +10,7 @@
 #include "check/hostcheck.h"
 #include "checksums.h"
 #include "child.h"
+#include "look.h"
 
 namespace {
 
@@ -33,8 +34,8 @@ void checkPresence(HostCheck &check, const std::string &tool) {
 
 void checkClock(HostCheck &check) {
   const std::time_t now = std::time(nullptr);
-  struct stat log = {};
-  if (stat((check.home + "patchlogs/orvpatch.log").c_str(), &log) == 0 && log.st_mtime > now)
+  const std::optional<struct stat> log = lookBehind(check.home + "patchlogs/orvpatch.log");
+  if (log && log->st_mtime > now)
     check.add("clock-behind", "", "patchlogs/orvpatch.log", "the log was written in the future");
   for (const Patch &patch : check.patches) {
     const auto newest = std::max_element(patch.members.begin(), patch.members.end(),

@@ -113,7 +113,7 @@ private:
 
   bool fixDirectory(const HomeState &state) {
     if (found_.hasRecord) {
-      closeDirectories(home_.path(), found_.record);
+      closeDirectories(home_.path(), found_.record, messages_);
       const std::optional<FileState> now = stateOf(home_.at(state.path));
       return now && now->mode != 0700;
     }

@@ -189,7 +189,7 @@ void fillRecord(const Home &home, Interruption &found) {
   for (const InterruptedPatch &patch : found.patches)
     record.patches.push_back({patch.patch.file, "", patch.patch.descriptor->getProductCode(),
                               patch.patch.name.getTarget(), patch.patch.descriptor->getPatchName(),
-                              patch.levelBefore, patch.levelAfter, ""});
+                              patch.levelBefore, patch.levelAfter, "", patch.versionFile});
   for (const InterruptedPatch &patch : found.patches)
     for (const InterruptedFile &file : patch.files)
       record.files.push_back({file.path, file.before, stateOf(home.at(file.path)), ""});

@@ -23,10 +23,6 @@ constexpr std::array<const char *, 13> order = {
     "file-attributes", "directory-closed",  "level-old",     "level-empty",  "result-file-empty",
     "history-missing", "applied",           "temporary-left"};
 
-bool isSameInode(const FileState &a, const FileState &b) {
-  return a.device == b.device && a.inode == b.inode;
-}
-
 bool isInstance(const RecordedInstance &a, const RecordedInstance &b) {
   return a.product == b.product && a.name == b.name;
 }
@@ -117,7 +113,7 @@ private:
       return;
     }
     const std::optional<FileState> source = stateOf(sourceOf(home_, patch, file.path));
-    const bool isTwice = source && isSameInode(*source, *now);
+    const bool isTwice = source && source->device == now->device && isSameInode(*source, *now);
     if (!isTwice &&
         (found_.hasRecord ? !isNewByRecord(file, *now)
                           : source || !isNewByLog(patch, file) || different.count(file.path) != 0))

@@ -59,14 +59,18 @@ public:
       if (!prepare(path))
         return refused();
     } catch (...) {
+      bringBackSetAside(home_.path(), folder_, record_);
       place_.remove(id_);
       throw;
     }
     outlastInterruptions();
-    install();
-    if (record_.verdict != "applied" && options_.undoOnFailure)
-      step("undo", [this] { return undo(); });
-    finish();
+    try {
+      complete();
+    } catch (const std::exception &error) {
+      throw JudgementError(std::string(error.what()) + "\nThe transaction " + id_ +
+                           " did not end: orvpatchctl undo takes it back");
+    }
+    tidy();
     return record_;
   }
 
@@ -116,6 +120,17 @@ private:
     return count(record_.findings, Severity::Error) == 0;
   }
 
+  /// All that comes from the first change on.
+  void complete() {
+    install();
+    if (record_.verdict != "applied" && options_.undoOnFailure)
+      step("undo", [this] { return undo(); });
+    record_.ended = utcTime(std::time(nullptr));
+    record_.phase = Phase::Closed;
+    writePage(folder_, record_);
+    writeRecord(folder_, record_);
+  }
+
   void install() {
     record_.phase = Phase::Installing;
     writeRecord(folder_, record_);
@@ -129,8 +144,9 @@ private:
       return true;
     });
     step("directories", [this] {
-      closeDirectories(home_.path(), record_);
-      return true;
+      const std::size_t told = record_.messages.size();
+      closeDirectories(home_.path(), record_, record_.messages);
+      return record_.messages.size() == told;
     });
     record_.after = runningInstances(home_);
     noteMissingInstances();
@@ -156,7 +172,9 @@ private:
   /// Every patch against the home, and mode and owner of each file against what was there before.
   bool verify() {
     Verification verification = verifyPatches(home_, applicablePatches(home_, taken_));
-    verifyAttributes(record_, verification);
+    for (const TouchedFile &file : record_.files)
+      if (file.after)
+        verifyAttributes(file, *file.after, verification);
     record_.differences = verification.differences;
     return verification.differences.empty();
   }
@@ -187,13 +205,14 @@ private:
     return record_;
   }
 
-  void finish() {
-    record_.ended = utcTime(std::time(nullptr));
-    record_.phase = Phase::Closed;
-    writePage(folder_, record_);
-    writeRecord(folder_, record_);
-    removePatches(folder_ + "/patches");
-    place_.keepNewest(options_.keep);
+  /// The installation has its record: what cannot be cleared away does not change how it ended.
+  void tidy() {
+    try {
+      removePatches(folder_ + "/patches");
+      place_.keepNewest(options_.keep);
+    } catch (const JudgementError &error) {
+      record_.messages.emplace_back(error.what());
+    }
   }
 
   const Home &home_;

@@ -5,8 +5,10 @@
 #include <set>
 
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include "history.h"
+#include "judgement.h"
 #include "text.h"
 #include "utilities.h"
 
@@ -35,10 +37,13 @@ std::map<std::string, FileState> look(const Home &home, const Record &record) {
       entry.disable_recursion_pending();
       continue;
     }
-    const std::optional<FileState> state = stateOf(entry->path());
-    if (state && named.count(path) == 0)
+    if (named.count(path) != 0 || access(entry->path().parent_path().c_str(), X_OK) != 0)
+      continue; // what a directory holds that is closed to this user cannot be compared
+    if (const std::optional<FileState> state = stateOf(entry->path()))
       found.emplace(path, *state);
   }
+  if (error)
+    throw JudgementError("cannot look through " + home.path() + ": " + error.message());
   return found;
 }
 
@@ -91,19 +96,16 @@ void noteResults(const Home &home, Record &record) {
   }
 }
 
-void verifyAttributes(const Record &record, Verification &verification) {
-  for (const TouchedFile &file : record.files) {
-    if (!file.after || S_ISLNK(file.after->type))
-      continue;
-    const bool kept = file.before && !S_ISLNK(file.before->type);
-    const unsigned mode = kept ? file.before->mode : 0755;
-    if ((!file.before || kept) && file.after->mode != mode)
-      verification.add(file.path, "mode",
-                       "the mode is " + octalMode(file.after->mode) + ", not " + octalMode(mode));
-    if (kept && (file.after->user != file.before->user || file.after->group != file.before->group))
-      verification.add(file.path, "owner",
-                       "it belongs to " + std::to_string(file.after->user) + ":" +
-                           std::to_string(file.after->group) + ", before to " +
-                           std::to_string(file.before->user) + ":" + std::to_string(file.before->group));
-  }
+void verifyAttributes(const TouchedFile &file, const FileState &now, Verification &verification) {
+  if (S_ISLNK(now.type))
+    return;
+  const bool isReplaced = file.before && !S_ISLNK(file.before->type);
+  const unsigned mode = isReplaced ? file.before->mode : 0755;
+  if ((isReplaced || !file.before) && now.mode != mode)
+    verification.add(file.path, "mode", "the mode is " + octalMode(now.mode) + ", not " + octalMode(mode));
+  const std::optional<FileState> &owned = isReplaced ? file.before : file.after;
+  if (owned && (now.user != owned->user || now.group != owned->group))
+    verification.add(file.path, "owner",
+                     "it belongs to " + std::to_string(now.user) + ":" + std::to_string(now.group) +
+                         ", not to " + std::to_string(owned->user) + ":" + std::to_string(owned->group));
 }

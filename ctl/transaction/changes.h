@@ -24,5 +24,6 @@ private:
 /// Takes the results of the patches from the lines that the installation has added to the history.
 void noteResults(const Home &home, Record &record);
 
-/// Mode and owner of each file that was installed: a replaced one has those of the old one, a new one 0755.
-void verifyAttributes(const Record &record, Verification &verification);
+/// Mode and owner of a file that was installed and is `now` so: a replaced one has those of the old one, a
+/// new one 0755 and the owner that the installation gave it.
+void verifyAttributes(const TouchedFile &file, const FileState &now, Verification &verification);

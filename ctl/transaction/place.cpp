@@ -10,6 +10,7 @@
 #include <unistd.h>
 
 #include "judgement.h"
+#include "look.h"
 #include "transaction/record.h"
 
 namespace {
@@ -43,13 +44,7 @@ std::string nameOfNow() {
 
 /// A folder without a record is one of a transaction that was killed before it had changed anything.
 bool hasEnded(const std::string &folder) {
-  if (access((folder + "/record.json").c_str(), F_OK) != 0)
-    return true;
-  try {
-    return readRecord(folder).phase == Phase::Closed;
-  } catch (const JudgementError &) {
-    return false;
-  }
+  return !stateOf(folder + "/record.json") || readRecord(folder).phase == Phase::Closed;
 }
 
 } // namespace
@@ -62,12 +57,11 @@ TransactionPlace::TransactionPlace(const std::string &home) : root_(home + "patc
 
 std::vector<std::string> TransactionPlace::ids() const {
   std::vector<std::string> names;
-  std::error_code error;
-  for (const fs::directory_entry &entry : fs::directory_iterator(root_, error))
-    if (entry.is_directory(error) && !entry.is_symlink(error))
-      names.push_back(entry.path().filename());
-  if (error)
-    throw JudgementError("cannot read " + root_ + ": " + error.message());
+  listDirectory(root_, [&](const std::string &name) {
+    const std::optional<FileState> state = stateOf(folderOf(name));
+    if (state && S_ISDIR(state->type))
+      names.push_back(name);
+  });
   std::sort(names.begin(), names.end());
   return names;
 }
@@ -80,7 +74,11 @@ std::string TransactionPlace::create() const {
   return id;
 }
 
+// The record first: one that is only removed in part must not pass for one that can be undone.
 void TransactionPlace::remove(const std::string &id) const {
+  const std::string record = folderOf(id) + "/record.json";
+  if (unlink(record.c_str()) != 0 && errno != ENOENT)
+    throw JudgementError("cannot remove " + record + ": " + strerror(errno));
   std::error_code error;
   fs::remove_all(folderOf(id), error);
   if (error)

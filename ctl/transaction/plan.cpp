@@ -22,7 +22,8 @@ RecordedPatch recordedPatch(const Home &home, const Patch &patch) {
           descriptor.getPatchName(),
           levelIn(versionFileOf(home, patch)),
           descriptor.getVersion()->getDottedVersionString(),
-          ""};
+          "",
+          versionFileOf(home, patch).substr(home.path().size())};
 }
 
 /// The directories above a path, from the top.

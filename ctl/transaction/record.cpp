@@ -13,6 +13,7 @@
 #include "filedescriptor.h"
 #include "inputfile.h"
 #include "judgement.h"
+#include "look.h"
 #include "text.h"
 
 using Json = nlohmann::ordered_json;
@@ -68,7 +69,8 @@ Json patchesJson(const Record &record) {
                     {"name", jsonText(patch.name)},
                     {"levelBefore", jsonText(patch.levelBefore)},
                     {"levelAfter", jsonText(patch.levelAfter)},
-                    {"result", patch.result}});
+                    {"result", patch.result},
+                    {"versionFile", jsonText(patch.versionFile)}});
   return list;
 }
 
@@ -143,7 +145,7 @@ void readLists(const Json &json, Record &record) {
   for (const Json &one : json.at("patches"))
     record.patches.push_back({bytesAt(one, "file"), one.at("sha256"), bytesAt(one, "product"),
                               one.at("target"), bytesAt(one, "name"), bytesAt(one, "levelBefore"),
-                              bytesAt(one, "levelAfter"), one.at("result")});
+                              bytesAt(one, "levelAfter"), one.at("result"), bytesAt(one, "versionFile")});
   for (const Json &one : json.at("files"))
     record.files.push_back(
         {bytesAt(one, "path"), stateFrom(one.at("before")), stateFrom(one.at("after")), one.at("saved")});
@@ -201,17 +203,20 @@ Json textOrNull(const std::string &text) {
 } // namespace
 
 std::optional<FileState> stateOf(const std::string &path) {
-  struct stat status = {};
-  if (lstat(path.c_str(), &status) != 0)
+  const std::optional<struct stat> status = lookAt(path);
+  if (!status)
     return std::nullopt;
-  return FileState{status.st_mode & S_IFMT, status.st_mode & 07777U, status.st_uid,
-                   status.st_gid,           status.st_size,          status.st_mtim.tv_sec,
-                   status.st_mtim.tv_nsec,  status.st_dev,           status.st_ino};
+  return FileState{status->st_mode & S_IFMT, status->st_mode & 07777U, status->st_uid,
+                   status->st_gid,           status->st_size,          status->st_mtim.tv_sec,
+                   status->st_mtim.tv_nsec,  status->st_dev,           status->st_ino};
+}
+
+bool isSameInode(const FileState &a, const FileState &b) {
+  return a.inode == b.inode && a.type == b.type;
 }
 
 bool isSameFile(const FileState &a, const FileState &b) {
-  return a.device == b.device && a.inode == b.inode && a.type == b.type && a.size == b.size &&
-         a.seconds == b.seconds && a.nanoseconds == b.nanoseconds;
+  return isSameInode(a, b) && a.size == b.size && a.seconds == b.seconds && a.nanoseconds == b.nanoseconds;
 }
 
 Json toJson(const Record &record) {
@@ -276,5 +281,10 @@ Record readRecord(const std::string &folder) {
   const InputFile file(folder + "/record.json");
   if (!file.exists())
     throw JudgementError("no record in " + folder);
-  return parseRecord(file.content(LargestRecord));
+  const std::string text = file.content(LargestRecord);
+  try {
+    return parseRecord(text);
+  } catch (const JudgementError &error) {
+    throw JudgementError(folder + "/record.json: " + error.what());
+  }
 }

@@ -29,10 +29,13 @@ struct FileState {
   std::uint64_t inode = 0;
 };
 
-/// The state of what is at `path` itself; none where nothing is.
+/// The state of what is at `path` itself; none where nothing is. JudgementError when that cannot be told.
 std::optional<FileState> stateOf(const std::string &path);
-/// The same file with the same content: device, inode, size and time.
+/// The same file with the same content: inode, type, size and time. The number of a device is not compared:
+/// another mount or another start of the system may give it another one.
 bool isSameFile(const FileState &a, const FileState &b);
+/// The same file, whatever its content is by now.
+bool isSameInode(const FileState &a, const FileState &b);
 
 /// A file that a patch brings.
 struct TouchedFile {
@@ -63,7 +66,8 @@ struct RecordedPatch {
   std::string name;
   std::string levelBefore;
   std::string levelAfter;
-  std::string result; ///< PASS, FAIL, or empty when the patch's turn did not come
+  std::string result;      ///< PASS, FAIL, or empty when the patch's turn did not come
+  std::string versionFile; ///< that holds its level
 };
 
 struct RecordedInstance {

@@ -22,5 +22,9 @@ void noteInstalled(const std::string &home, Record &record);
 void restoreFiles(const std::string &home, const std::string &folder, const Record &record,
                   std::vector<std::string> &messages);
 
-/// Gives new directories the mode, owner and group of their parents, in place of 0777.
-void closeDirectories(const std::string &home, const Record &record);
+/// Moves the left-overs back that saveFiles has set aside, where the installation was not begun.
+/// JudgementError when it cannot.
+void bringBackSetAside(const std::string &home, const std::string &folder, const Record &record);
+
+/// Gives new directories the mode, owner and group of their parents, in place of 0777; tells where it cannot.
+void closeDirectories(const std::string &home, const Record &record, std::vector<std::string> &messages);

@@ -22,16 +22,13 @@ bool isUndoable(const Record &record) {
   return record.action == "apply" && record.verdict != "undone" && record.verdict != "refused";
 }
 
-/// The records of all transactions, oldest first; what is no record is passed over.
+/// The records of all transactions, oldest first. A folder without one is of a transaction that was killed
+/// before it had changed anything.
 std::vector<Record> readRecords(const TransactionPlace &place) {
   std::vector<Record> records;
-  for (const std::string &id : place.ids()) {
-    try {
+  for (const std::string &id : place.ids())
+    if (stateOf(place.folderOf(id) + "/record.json"))
       records.push_back(readRecord(place.folderOf(id)));
-    } catch (const JudgementError &) { // a folder whose record was not written yet: nothing was changed
-      continue;
-    }
-  }
   return records;
 }
 

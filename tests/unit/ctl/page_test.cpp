@@ -16,7 +16,7 @@ Record recordWith(const std::string &text) {
   record.verdict = "failed";
   record.home = text;
   record.user = text;
-  record.patches.push_back({text, "", text, text, text, text, text, text});
+  record.patches.push_back({text, "", text, text, text, text, text, text, text});
   record.findings.push_back({text, Severity::Error, text, text, text, text});
   record.steps.push_back({text, 1, text});
   record.files.push_back({text, std::nullopt, std::nullopt, ""});
