@@ -23,7 +23,7 @@ _orvpatchctl() {
       mapfile -t COMPREPLY < <(compgen -W 'auto always never' -- "$word")
       return
       ;;
-    --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since | --path | --keep)
+    --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since | --transaction | --path | --keep)
       :
       return
       ;;
@@ -31,7 +31,7 @@ _orvpatchctl() {
   # The command, and the number of its arguments before the cursor.
   for ((place = 1; place < COMP_CWORD; place++)); do
     case ${COMP_WORDS[place]} in
-      --output | --keyring | --installer | --color | --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since | --path | --keep) ((place++)) ;;
+      --output | --keyring | --installer | --color | --product | --level | --name | --description | --platform | --target | --fixpack | --sign | --explain | --since | --transaction | --path | --keep) ((place++)) ;;
       -*) ;;
       *) if [[ -z $command ]]; then command=${COMP_WORDS[place]}; else ((count++)); fi ;;
     esac
@@ -66,7 +66,7 @@ _orvpatchctl() {
       kinds=(d)
       ;;
     verify)
-      options='--help --json --color'
+      options='--help --json --color --transaction'
       kinds=(d f)
       ;;
     log)

@@ -7,7 +7,7 @@ complete -c orvpatchctl -n __fish_use_subcommand -a lint -d 'Tell what is wrong 
 complete -c orvpatchctl -n __fish_use_subcommand -a show -d 'Print a patch as the installer will read it'
 complete -c orvpatchctl -n __fish_use_subcommand -a status -d 'Print what is installed in a home, what of it runs, and the last patches'
 complete -c orvpatchctl -n __fish_use_subcommand -a history -d 'Print the attempts to install patches, with what was taken back'
-complete -c orvpatchctl -n __fish_use_subcommand -a verify -d 'Compare what a patch brings with what the home has'
+complete -c orvpatchctl -n __fish_use_subcommand -a verify -d 'Compare what a patch brought with what the home has'
 complete -c orvpatchctl -n __fish_use_subcommand -a log -d 'Print the runs of the log, or one with its steps, programs and errors'
 complete -c orvpatchctl -n __fish_use_subcommand -a check -d 'Tell whether an installation will go through on this host'
 complete -c orvpatchctl -n __fish_use_subcommand -a apply -d 'Install patches so that they can be undone'
@@ -56,6 +56,7 @@ complete -c orvpatchctl -n '__fish_seen_subcommand_from history' -f -a '(__fish_
 complete -c orvpatchctl -n '__fish_seen_subcommand_from verify' -l help -d 'Print this help message and exit'
 complete -c orvpatchctl -n '__fish_seen_subcommand_from verify' -l json -d 'One JSON document on standard output'
 complete -c orvpatchctl -n '__fish_seen_subcommand_from verify' -l color -x -a 'auto always never' -d 'Colours: auto (on a terminal, unless NO_COLOR is set), always or never'
+complete -c orvpatchctl -n '__fish_seen_subcommand_from verify' -l transaction -x -d 'Against the record of this transaction, in place of a patch'
 complete -c orvpatchctl -n '__fish_seen_subcommand_from verify' -F
 complete -c orvpatchctl -n '__fish_seen_subcommand_from log' -l help -d 'Print this help message and exit'
 complete -c orvpatchctl -n '__fish_seen_subcommand_from log' -l json -d 'One JSON document on standard output'

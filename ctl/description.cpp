@@ -7,7 +7,9 @@
 namespace {
 
 /// What a value is, by the word that stands for it in the help.
-ValueKind kindOf(const std::string &value) {
+ValueKind kindOf(std::string value) {
+  if (value.rfind('[', 0) == 0) // it may be left out
+    value.erase(0, 1);
   const auto isOne = [&value](std::initializer_list<const char *> words) {
     return std::any_of(words.begin(), words.end(),
                        [&value](const char *word) { return value.rfind(word, 0) == 0; });

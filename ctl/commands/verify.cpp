@@ -1,4 +1,4 @@
-// verify: proof that what a patch brings is what the home has.
+// verify: proof that what a patch brought is what the home has.
 #include <cstdio>
 
 #include <CLI/CLI.hpp>
@@ -9,6 +9,7 @@
 #include "home.h"
 #include "packages.h"
 #include "text.h"
+#include "transaction/proof.h"
 #include "verification.h"
 
 namespace {
@@ -22,9 +23,19 @@ void print(const Verification &verification, const OutputOptions &options) {
   printf("%zu files compared, %zu differences\n", verification.files, verification.differences.size());
 }
 
-void verify(const std::string &homePath, const std::string &path, Invocation &invocation) {
-  const Home home(homePath);
-  const Verification verification = verifyPatches(home, applicablePatches(home, path));
+struct Arguments {
+  std::shared_ptr<std::string> home;
+  std::string patch;
+  std::string transaction;
+};
+
+void verify(const Arguments &arguments, Invocation &invocation) {
+  if (arguments.patch.empty() && arguments.transaction.empty())
+    throw CLI::RequiredError("PATCH or --transaction");
+  const Home home(*arguments.home);
+  const Verification verification = arguments.transaction.empty()
+                                        ? verifyPatches(home, applicablePatches(home, arguments.patch))
+                                        : verifyTransaction(home, arguments.transaction);
   if (invocation.output.json)
     printDocument(toJson(verification));
   else
@@ -36,11 +47,16 @@ void verify(const std::string &homePath, const std::string &path, Invocation &in
 
 void addVerify(CLI::App &application, Invocation &invocation) {
   CLI::App *const command =
-      addCommand(application, invocation, "verify", "Compare what a patch brings with what the home has");
-  const std::shared_ptr<std::string> home = addHome(*command);
-  const auto path = std::make_shared<std::string>();
-  command->add_option("patch", *path, "A patch file, or a directory of them")
-      ->required()
-      ->option_text("PATCH");
-  command->callback([home, path, &invocation] { verify(*home, *path, invocation); });
+      addCommand(application, invocation, "verify", "Compare what a patch brought with what the home has");
+  const auto arguments = std::make_shared<Arguments>();
+  arguments->home = addHome(*command);
+  CLI::Option *const patch =
+      command->add_option("patch", arguments->patch, "A patch file, or a directory of them")
+          ->option_text("[PATCH]");
+  command
+      ->add_option("--transaction", arguments->transaction,
+                   "Against the record of this transaction, in place of a patch")
+      ->option_text("ID")
+      ->excludes(patch);
+  command->callback([arguments, &invocation] { verify(*arguments, invocation); });
 }
