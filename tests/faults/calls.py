@@ -14,7 +14,8 @@ class Kind(NamedTuple):
 
 
 KINDS = {
-    "look": Kind("access faccessat faccessat2 stat lstat fstat newfstatat statx fstatfs statfs readlink readlinkat",
+    "look": Kind("access faccessat faccessat2 stat lstat fstat newfstatat statx fstatfs statfs readlink readlinkat "
+                 "llistxattr",
                  "EACCES ENOENT EIO ENOMEM"),
     "open": Kind("open openat openat2", "EACCES ENOENT EIO EMFILE EINTR ENOMEM"),
     "list": Kind("getdents getdents64", "EIO ENOENT ENOMEM"),
@@ -28,7 +29,7 @@ KINDS = {
     "remove": Kind("unlink unlinkat rmdir", "EACCES EIO EPERM EROFS", changes=True),
     "link": Kind("link linkat rename renameat renameat2",
                  "EACCES ENOENT ENOSPC EIO EXDEV EMLINK EPERM EROFS ENOMEM", changes=True),
-    "attributes": Kind("chmod fchmod fchmodat fchmodat2 chown fchown lchown fchownat",
+    "attributes": Kind("chmod fchmod fchmodat fchmodat2 chown fchown lchown fchownat utimensat",
                        "EACCES EPERM EROFS EIO ENOENT", changes=True),
     "enter": Kind("chdir fchdir", "EACCES ENOENT EIO ENOMEM"),
     "where": Kind("getcwd", "EACCES ENOENT ENOMEM"),
@@ -38,11 +39,15 @@ KINDS = {
     "descriptor": Kind("fcntl dup dup2 dup3", "EPERM"),
     "memory": Kind("mmap", "ENOMEM"),
     "heap": Kind("brk", "ENOMEM"),
+    "memory file": Kind("memfd_create", "EMFILE ENOMEM"),
+    "lock": Kind("flock", "ENOLCK EINTR"),
+    "flags": Kind("ioctl", "EIO"),
     "socket": Kind("socket connect", "EACCES EMFILE ENOMEM"),
     "host": Kind("uname", "EPERM"),
     # With the arguments that the program gives them these cannot fail.
     "infallible": Kind("exit_group getpid getppid getuid geteuid getgid getegid munmap rt_sigaction rt_sigprocmask "
-                       "rt_sigreturn kill umask time clock_gettime", ""),
+                       "rt_sigreturn kill umask time clock_gettime clock_nanosleep prlimit64 getrandom setsid madvise "
+                       "mprotect futex sysinfo restart_syscall", ""),
 }
 _KIND_OF = {name: kind for kind, facts in KINDS.items() for name in facts.names.split()}
 _FLAGS_OF_WRITING = ("O_WRONLY", "O_RDWR", "O_CREAT")

@@ -1,0 +1,90 @@
+"""Each fallible call of orvpatchctl itself made to fail, once and from then on.
+
+A rotating sample in every run; ORVPATCH_FAULTS=all takes every call. ORVPATCH_SEED repeats a sample.
+"""
+
+import os
+import random
+import re
+import time
+from collections import Counter
+from typing import NamedTuple
+
+from faults.calls import KINDS, kind_of
+
+SEED = int(os.environ.get("ORVPATCH_SEED") or random.randrange(10**6))
+ALL = os.environ.get("ORVPATCH_FAULTS") == "all"
+# What the program does first; the calls before it are those of the dynamic loader.
+_FIRST_OWN_CALL = "rt_sigaction(SIGCHLD, {sa_handler=SIG_DFL"
+_CALL = re.compile(r"^(\w+)\(")
+# No faults but answers: nothing is there, or this user may not see it.
+_ANSWERS = {"look": {"ENOENT", "EACCES"}, "open": {"ENOENT", "EACCES"}, "list": {"ENOENT"}, "link": {"ENOENT", "EXDEV"},
+            "attributes": {"ENOENT"}, "make": {"ENOENT"}}
+_BURST = 3  # an interruption that never ends is no condition that exists
+
+
+class Fault(NamedTuple):
+    """The call of this name and ordinal fails with this error: once, or with all of its name that follow."""
+
+    call: str
+    ordinal: int
+    error: str
+    mode: str
+
+    def __str__(self):
+        return ":".join(map(str, self))
+
+    @property
+    def words(self):
+        """What strace takes."""
+        when = str(self.ordinal)
+        if self.mode == "on":
+            when += f"..{self.ordinal + _BURST - 1}" if self.error == "EINTR" else "+"
+        outcome = "retval=0" if kind_of(self.call) == "heap" else f"error={self.error}"
+        return ["-e", f"trace={self.call}", "-e", f"inject={self.call}:{outcome}:when={when}"]
+
+
+def strace(file, words=()):
+    return ["strace", "-y", "-o", os.fspath(file), *words]
+
+
+def faults_of(trace):
+    """A fault of each call that the undisturbed run has made: its errors take turns from call to call."""
+    counted, own, faults = Counter(), False, []
+    for line in trace.read_text(errors="replace").splitlines():
+        match = _CALL.match(line)
+        if not match:
+            continue
+        own = own or line.startswith(_FIRST_OWN_CALL)
+        counted[match[1]] += 1
+        if not own:
+            continue
+        kind = kind_of(match[1])
+        assert kind in KINDS, f"{kind}: say in tests/faults/calls.py how it fails"
+        errors = [error for error in KINDS[kind].errors.split() if error not in _ANSWERS.get(kind, ())]
+        if not errors:
+            continue
+        ordinal = counted[match[1]]
+        for mode in ("once",) if kind == "heap" else ("once", "on"):
+            faults.append(Fault(match[1], ordinal, errors[(ordinal + SEED) % len(errors)], mode))
+    assert faults
+    return faults
+
+
+def chosen(faults, count):
+    only = os.environ.get("ORVPATCH_FAULTS_ONLY")
+    if only:
+        return [Fault(call, int(ordinal), error, mode)
+                for call, ordinal, error, mode in (name.split(":") for name in only.split(","))]
+    return faults if ALL else random.Random(SEED).sample(faults, min(count, len(faults)))
+
+
+def outlived(run, seconds=120):
+    """The result of run(), once no installer is at work that has outlived its caller."""
+    limit = time.monotonic() + seconds
+    while True:
+        result = run()
+        if b"at work" not in result.err and b"other-run" not in result.out:
+            return result
+        assert time.monotonic() < limit, result
+        time.sleep(0.1)
