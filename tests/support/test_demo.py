@@ -19,7 +19,7 @@ def demo(program, scratch):
     def run(*options, commands=""):
         environment = {**os.environ, "TMPDIR": str(scratch), "SHELL": "/bin/sh"}
         return subprocess.run([DEMO, *options, program.binary], input=commands, env=environment, text=True,
-                              capture_output=True, timeout=120, check=False)
+                              capture_output=True, timeout=300, check=False)
 
     return run
 
@@ -31,6 +31,15 @@ def test_the_demo_ends_as_announced_and_leaves_nothing(demo, scratch):
     statuses = re.findall(r"^    \(exit status (\d+)\)$", done.stdout, re.M)
     assert statuses == ["0", "35", "0", "0", "11", "21", "0", "0"]
     assert done.stdout.count("06100000 -> 06100002\n") == 6
+    assert list(scratch.iterdir()) == []
+
+
+def test_the_part_of_orvpatchctl_ends_as_announced_and_leaves_nothing(demo, scratch):
+    done = demo("--ctl")
+    assert (done.returncode, done.stderr) == (0, "")
+    assert done.stdout.endswith("\n== Everything went as announced\n")
+    statuses = re.findall(r"^    \(exit status (\d+)\)$", done.stdout, re.M)
+    assert statuses == ["0", "1", "1", "0", "0", "0", "0", "3", "0", "0", "0", "0", "0", "0"]
     assert list(scratch.iterdir()) == []
 
 
@@ -50,7 +59,7 @@ def test_a_step_that_does_not_go_as_announced_ends_the_demo(scratch):
     (other / "orvpatch").write_text("#!/bin/sh\nexit 0\n")
     (other / "orvpatch").chmod(0o755)
     done = subprocess.run([DEMO, other / "orvpatch"], env={**os.environ, "TMPDIR": str(scratch)}, text=True,
-                          capture_output=True, timeout=120, check=False)
+                          capture_output=True, timeout=300, check=False)
     assert done.returncode == 1
     assert "NOT AS ANNOUNCED" in done.stderr
     assert [path.name for path in scratch.iterdir()] == ["bin"]
