@@ -11,9 +11,9 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "file.h"
 #include "judgement.h"
 #include "logger.h"
+#include "look.h"
 #include "orvcomponentregistry.h"
 #include "patchfilename.h"
 #include "process.h"
@@ -143,12 +143,11 @@ std::vector<std::string> Home::leftovers() const {
   const std::string tmp = at("tmp/");
   if (access(tmp.c_str(), F_OK) != 0 && errno == ENOENT)
     return {};
-  requireDirectory(tmp);
   std::vector<std::string> found;
-  File directory(tmp);
-  for (const File *entry : *directory.listSubDirectories())
-    if (isPatchDirectory(tmp, entry->getName()))
-      found.push_back("tmp/" + entry->getName());
+  listDirectory(tmp, [&](const std::string &name) {
+    if (isDirectory(tmp + name) && isPatchDirectory(tmp, name))
+      found.push_back("tmp/" + name);
+  });
   std::sort(found.begin(), found.end());
   return found;
 }

@@ -38,6 +38,11 @@ std::optional<struct stat> lookBehind(const std::string &path) {
   return look(path, 0);
 }
 
+bool isDirectory(const std::string &path) {
+  const std::optional<struct stat> status = lookBehind(path);
+  return status && S_ISDIR(status->st_mode);
+}
+
 bool listDirectory(const std::string &path, const std::function<void(const std::string &name)> &each) {
   const std::unique_ptr<DIR, CloseDirectory> directory(opendir(path.c_str()));
   if (directory == nullptr) {

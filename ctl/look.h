@@ -13,6 +13,8 @@ std::optional<struct stat> lookAt(const std::string &path);
 /// The same of what a symbolic link there leads to.
 std::optional<struct stat> lookBehind(const std::string &path);
 
+bool isDirectory(const std::string &path);
+
 /// Calls `each` with the name of every entry but "." and "..", in the order of the directory; false when
 /// there is no such directory. JudgementError when it cannot be read to its end.
 bool listDirectory(const std::string &path, const std::function<void(const std::string &name)> &each);

@@ -37,11 +37,6 @@ private:
   int fd_;
 };
 
-bool isDirectory(const std::string &path) {
-  const std::optional<struct stat> status = lookBehind(path);
-  return status && S_ISDIR(status->st_mode);
-}
-
 std::size_t rankOf(const std::string &path) {
   return targetOrder(PatchFileName(File(path).getName()).getTarget());
 }

@@ -1,26 +1,38 @@
 #include "processes.h"
 
 #include <algorithm>
-#include <climits>
+#include <cerrno>
 #include <cstdlib>
 #include <cstring>
-#include <filesystem>
 #include <fstream>
-#include <sstream>
 
 #include <pwd.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "judgement.h"
+#include "look.h"
+
 namespace {
 
-namespace fs = std::filesystem;
+[[noreturn]] void cannotTell(const std::string &path) {
+  throw JudgementError("cannot tell which installers run: " + path + ": " + strerror(errno));
+}
+
+/// A process that has ended meanwhile, or one that other users may not see.
+bool hasEnded(int error) {
+  return error == ENOENT || error == ESRCH || error == EACCES || error == EPERM;
+}
 
 std::vector<std::string> wordsOf(const std::string &pid) {
   std::ifstream file("/proc/" + pid + "/cmdline", std::ios::binary);
+  if (!file && !hasEnded(errno))
+    cannotTell("/proc/" + pid);
   std::vector<std::string> words;
   for (std::string word; std::getline(file, word, '\0');)
     words.push_back(word);
+  if (file.bad() && !hasEnded(errno))
+    cannotTell("/proc/" + pid);
   return words;
 }
 
@@ -32,6 +44,8 @@ std::string baseName(const std::string &path) {
 std::string placeOf(const std::string &pid, const std::string &path) {
   const std::string seen = path.empty() || path.front() != '/' ? "/proc/" + pid + "/cwd/" + path : path;
   char *const resolved = realpath(seen.c_str(), nullptr);
+  if (resolved == nullptr && !hasEnded(errno) && errno != ENOTDIR && errno != ELOOP && errno != ENAMETOOLONG)
+    cannotTell(seen);
   const std::string place = resolved == nullptr ? "" : resolved;
   free(resolved);
   return place;
@@ -59,15 +73,13 @@ std::string joined(const std::vector<std::string> &words) {
 std::vector<std::string> installerRuns(const std::string &home) {
   std::vector<std::string> runs;
   const std::string place = placeOf("self", home);
-  std::error_code error;
-  for (const fs::directory_entry &entry : fs::directory_iterator("/proc", error)) {
-    const std::string pid = entry.path().filename();
+  listDirectory("/proc", [&](const std::string &pid) {
     if (pid.find_first_not_of("0123456789") != std::string::npos || pid == std::to_string(getpid()))
-      continue;
+      return;
     const std::vector<std::string> words = wordsOf(pid);
     if (isInstallerOn(pid, words, place))
       runs.push_back("process " + pid + ": " + joined(words));
-  }
+  });
   return runs;
 }
 

@@ -7,7 +7,7 @@
 
 #include "commands/command.h"
 #include "commands/commands.h"
-#include "file.h"
+#include "look.h"
 #include "patch.h"
 #include "text.h"
 #include "updatedfiles.h"
@@ -170,7 +170,7 @@ void show(const std::string &path, Invocation &invocation) {
   Json list = Json::array();
   for (const Patch &patch : patches)
     list.push_back(describe(patch));
-  printDocument(File(path).isDirectory() ? list : list.front());
+  printDocument(isDirectory(path) ? list : list.front());
 }
 
 } // namespace

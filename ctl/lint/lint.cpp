@@ -5,9 +5,9 @@
 
 #include <sys/stat.h>
 
-#include "file.h"
 #include "judgement.h"
 #include "lint/subject.h"
+#include "look.h"
 #include "utilities.h"
 
 namespace {
@@ -42,20 +42,19 @@ bool isCompanion(const std::string &folder, const std::string &file, const std::
 }
 
 /// The names of the files of a directory. A pipe or a device is passed over, as the installer does.
-std::set<std::string> filesOf(File &directory) {
+std::set<std::string> filesOf(const std::string &folder) {
   std::set<std::string> files;
-  for (const File *file : *directory.listFiles()) {
-    struct stat status = {};
-    if (stat(file->getPath().c_str(), &status) != 0 || S_ISREG(status.st_mode))
-      files.insert(file->getName());
-  }
+  listDirectory(folder, [&](const std::string &name) {
+    const std::optional<struct stat> status = lookBehind(folder + name);
+    if (!status || S_ISREG(status->st_mode))
+      files.insert(name);
+  });
   return files;
 }
 
-PatchSet readSet(File &directory) {
+PatchSet readSet(const std::string &folder) {
   PatchSet set;
-  const std::string folder = directory.getPath();
-  const std::set<std::string> files = filesOf(directory);
+  const std::set<std::string> files = filesOf(folder);
   for (const std::string &file : files) {
     const bool hasName = PatchFileName(file).isValid();
     if (hasName && isCompanion(folder, file, files))
@@ -87,15 +86,14 @@ void checkSet(const PatchSet &set, FindingList &findings) {
 } // namespace
 
 FindingList lint(const std::string &path) {
-  File given(path);
-  if (!given.exists())
+  if (!lookBehind(path))
     throw JudgementError("cannot read " + path);
   FindingList findings;
-  if (!given.isDirectory()) {
+  if (!isDirectory(path)) {
     checkPatch(examine(path, false), findings);
     return findings;
   }
-  const PatchSet set = readSet(given);
+  const PatchSet set = readSet(path.back() == '/' ? path : path + "/");
   for (const Subject &subject : set.patches)
     checkPatch(subject, findings);
   checkSet(set, findings);

@@ -10,6 +10,7 @@
 #include <sys/stat.h>
 
 #include "history.h"
+#include "look.h"
 #include "transaction/plan.h"
 #include "utilities.h"
 #include "verification.h"
@@ -194,12 +195,11 @@ private:
   }
 
   void tellEmptyFiles() {
-    std::error_code error;
-    for (const fs::directory_entry &entry : fs::directory_iterator(home_.at("registry"), error)) {
-      const std::string path = entry.path().string().substr(home_.path().size());
-      if (entry.path().extension() == ".ver" && isEmptyFile(path))
+    listDirectory(home_.at("registry"), [this](const std::string &name) {
+      const std::string path = "registry/" + name;
+      if (fs::path(name).extension() == ".ver" && isEmptyFile(path))
         add("level-empty", path);
-    }
+    });
     if (isEmptyFile("vmaorv6/agentdepot/rc.txt"))
       add("result-file-empty", "vmaorv6/agentdepot/rc.txt");
   }

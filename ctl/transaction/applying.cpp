@@ -92,6 +92,8 @@ private:
       taken_ = takePatches(path, folder_ + "/patches");
       return true;
     });
+    planReport(home_, taken_, record_);
+    writeRecord(folder_, record_);
     if (!step("check", [&] { return check(path); }))
       return false;
     const std::vector<Patch> patches = applicablePatches(home_, taken_);

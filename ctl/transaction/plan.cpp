@@ -79,9 +79,13 @@ private:
   std::size_t names_ = 0;
 };
 
-/// The undo removes it: what is no plain name must not be built into a path.
+/// The undo removes its directory: what is no plain name must not be built into a path.
+bool isPlainName(const std::string &code) {
+  return !code.empty() && code != "." && code != ".." && code.find('/') == std::string::npos;
+}
+
 std::string temporaryDirectory(const std::string &code) {
-  if (code.empty() || code == "." || code == ".." || code.find('/') != std::string::npos)
+  if (!isPlainName(code))
     throw RefusalError("a product code that is no name of a directory: " + code);
   return "tmp/" + code;
 }
@@ -107,7 +111,23 @@ std::string levelIn(const std::string &versionFile) {
   return level.empty() ? "" : Version(level).getDottedVersionString();
 }
 
+void planReport(const Home &home, const std::string &path, Record &record) {
+  if (!stateOf(home.at("tmp")))
+    record.directories.push_back({"tmp"});
+  std::set<std::string> codes;
+  for (const std::string &file : patchFiles(path)) {
+    const Patch patch = readPatch(file);
+    codes.insert(patch.name.getProduct());
+    if (patch.descriptor != nullptr)
+      codes.insert(patch.descriptor->getProductCode());
+  }
+  for (const std::string &code : codes)
+    if (isPlainName(code) && !stateOf(home.at("tmp/" + code)))
+      record.temporary.push_back("tmp/" + code);
+}
+
 void planInstallation(const Home &home, const std::vector<Patch> &patches, Record &record) {
+  record.directories.clear();
   Plan plan(home, record);
   plan.addDirectory("tmp");
   std::set<std::string> temporary;

@@ -9,6 +9,10 @@
 #include "patch.h"
 #include "transaction/record.h"
 
+/// Fills the record's temporary and new directories with those that the report makes: a transaction that is
+/// interrupted before its plan is made leaves nothing else.
+void planReport(const Home &home, const std::string &path, Record &record);
+
 /// Fills the record's patches, files, rewritten files, directories, left-overs to set aside and the instances
 /// that run now.
 void planInstallation(const Home &home, const std::vector<Patch> &patches, Record &record);

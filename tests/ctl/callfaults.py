@@ -3,6 +3,7 @@
 A rotating sample in every run; ORVPATCH_FAULTS=all takes every call. ORVPATCH_SEED repeats a sample.
 """
 
+import json
 import os
 import random
 import re
@@ -77,6 +78,27 @@ def chosen(faults, count):
         return [Fault(call, int(ordinal), error, mode)
                 for call, ordinal, error, mode in (name.split(":") for name in only.split(","))]
     return faults if ALL else random.Random(SEED).sample(faults, min(count, len(faults)))
+
+
+def try_each(name, faults, judge):
+    """Judges every fault before it says which of them failed, and how."""
+    failed = 0
+    for fault in faults:
+        try:
+            judge(fault)
+        except AssertionError as error:
+            failed += 1
+            print(f"ORVPATCH_FAULTS_ONLY={fault}: {str(error)[:2000]}", flush=True)
+    print(f"{name}: {len(faults)} faults, {failed} failed")
+    assert not failed, f"{failed} of {len(faults)} faults, see above"
+
+
+def document_of(result):
+    """What is on standard output; None for nothing, or for a document that was cut off."""
+    try:
+        return json.loads(result.out)
+    except ValueError:
+        return None
 
 
 def outlived(run, seconds=120):

@@ -5,9 +5,12 @@ written until then, and nothing of what it still holds in memory.
 """
 
 import contextlib
+import ctypes
 import os
 import shutil
 import subprocess
+import tempfile
+from pathlib import Path
 
 import pytest
 
@@ -16,6 +19,7 @@ from support.scratch import remove_tree, scratch_folder
 MAKE = {"ext4": ["mkfs.ext4", "-q", "-F"], "xfs": ["mkfs.xfs", "-q", "-f"], "btrfs": ["mkfs.btrfs", "-q", "-f"]}
 _MEBIBYTES = 384  # xfs takes no fewer than 300
 _OUTER = 4096
+_NEW_MOUNTS = 0x20000  # CLONE_NEWNS
 
 
 def _run(*words):
@@ -52,8 +56,25 @@ class PowerSupply:
             yield self.point
         finally:
             _run("umount", self.point)
-            if self.kind == "btrfs":  # all copies bear one number, by which the kernel knows the last one
-                subprocess.run(["btrfs", "device", "scan", "--forget"], check=False, capture_output=True)
+
+
+@contextlib.contextmanager
+def private_mounts():
+    """What is mounted meanwhile is seen by this process and its children alone: the copy of a mount in another
+    name space would keep it busy. Skips where that is not allowed."""
+    here, before = os.getcwd(), os.open("/proc/thread-self/ns/mnt", os.O_RDONLY | os.O_CLOEXEC)
+    library = ctypes.CDLL(None, use_errno=True)
+    try:
+        if library.unshare(_NEW_MOUNTS) != 0:
+            pytest.skip(f"no mounts of its own: {os.strerror(ctypes.get_errno())}")
+        try:
+            _run("mount", "--make-rprivate", "/")
+            yield
+        finally:
+            assert library.setns(before, _NEW_MOUNTS) == 0
+            os.chdir(here)
+    finally:
+        os.close(before)
 
 
 @contextlib.contextmanager
@@ -64,6 +85,7 @@ def power_supply(kind):
             pytest.skip(f"{program} is not installed")
     memory = "/dev/shm" if os.path.isdir("/dev/shm") else None
     with contextlib.ExitStack() as stack:
+        stack.enter_context(private_mounts())
         top = scratch_folder()
         stack.callback(remove_tree, top)
         image = (top if memory is None else stack.enter_context(_temporary(memory))) / "outer"
@@ -82,7 +104,5 @@ def power_supply(kind):
 
 @contextlib.contextmanager
 def _temporary(parent):
-    import tempfile
-    from pathlib import Path
     with tempfile.TemporaryDirectory(prefix="orvpatch-", dir=parent) as folder:
         yield Path(folder)

@@ -1,10 +1,8 @@
 """System calls of apply and undo that fail: the status says how it ended, and the home can be taken back."""
 
-import json
-
 import pytest
 
-from callfaults import ALL, SEED, chosen, faults_of, outlived, strace
+from callfaults import SEED, chosen, document_of, faults_of, outlived, strace, try_each
 from oracle import listing
 from support import Patch, ProductHome
 
@@ -61,16 +59,9 @@ def is_mute(fault):
     return fault.call == "write" and fault.mode == "on"
 
 
-def tell(result):
-    try:
-        return json.loads(result.out)
-    except ValueError:  # nothing, or one that was cut off
-        return None
-
-
 def judge_apply(result, before, home, wanted, fault):
     """The status of the design, and what it promises."""
-    document = tell(result)
+    document = document_of(result)
     assert result.status in (0, 1, 2, 3, 4), result
     assert document or result.err or is_mute(fault), result
     if result.status == 0:
@@ -94,47 +85,33 @@ def take_back(bench, home, before):
     assert state(home) == before, result
 
 
-def report(name, faults, failed):
-    print(f"{name}: {len(faults)} faults, {len(failed)} failed")
-    assert not failed, failed
-
-
 def test_calls_of_apply_fail(bench):
     with bench.home() as home:
         faults = chosen(bench.faults("apply", home, bench.patch, "--yes", "--json"), SAMPLE)
         wanted = {path: entry["content"] for path, entry in listing(home).items()}
-    failed = []
-    for fault in faults:
+
+    def judge(fault):
         with bench.home() as home:
             before = state(home)
-            try:
-                judge_apply(bench.apply(home, fault), before, home, wanted, fault)
-                take_back(bench, home, before)
-            except AssertionError as error:
-                if not ALL:
-                    raise AssertionError(f"ORVPATCH_FAULTS_ONLY={fault}") from error
-                failed.append((str(fault), str(error)[:600]))
-    report("apply", faults, failed)
+            judge_apply(bench.apply(home, fault), before, home, wanted, fault)
+            take_back(bench, home, before)
+
+    try_each("apply", faults, judge)
 
 
 def test_calls_of_undo_fail(bench):
     with bench.home() as home:
         assert bench.apply(home).status == 0
         faults = chosen(bench.faults("undo", home, "--json"), SAMPLE)
-    failed = []
-    for fault in faults:
+
+    def judge(fault):
         with bench.home() as home:
             before = state(home)
             assert bench.apply(home).status == 0
-            try:
-                result = bench.undo(home, fault)
-                assert result.status in (0, 1, 2, 4), result
-                assert result.out or result.err or is_mute(fault), result
-                if result.status == 0:
-                    assert state(home) == before
-                take_back(bench, home, before)
-            except AssertionError as error:
-                if not ALL:
-                    raise AssertionError(f"ORVPATCH_FAULTS_ONLY={fault}") from error
-                failed.append((str(fault), str(error)[:600]))
-    report("undo", faults, failed)
+            result = bench.undo(home, fault)
+            assert result.status in (0, 1, 2, 4), result
+            assert result.out or result.err or is_mute(fault), result
+            assert result.status != 0 or state(home) == before
+            take_back(bench, home, before)
+
+    try_each("undo", faults, judge)
