@@ -18,15 +18,17 @@ ROOT = Path(__file__).resolve().parents[1]
 sys.path.insert(0, str(ROOT / "tests"))  # the sample home and the patch builder are those of the tests
 
 import picture  # noqa: E402
+from companion import companion_goals, companion_table  # noqa: E402
 from measure import Meter  # noqa: E402
 from memoryfs import memory_folder  # noqa: E402
 from payloads import PAYLOADS  # noqa: E402
 from rounds import Bench  # noqa: E402
-from tables import goals_table, growth_table, system_call_table, trial_table  # noqa: E402
+from tables import goals_table, growth_table, system_call_table, table, trial_table  # noqa: E402
 
 DOCUMENT = ROOT / "docs/performance.md"
 MARK = "<!-- below: what scripts/bench --write has put here -->\n"
 GROWTH = ("s1", "s10", "c")
+COMPANION = ("a", "c")
 PROGRAMS = ("cc", "tar", "dpkg", "rpm", "rsync")
 
 
@@ -37,6 +39,7 @@ def arguments():
     parser.add_argument("--rounds", type=int, default=7, help="default: %(default)s")
     parser.add_argument("--tiny", action="store_true", help="payloads of a few files: shows only that all of it runs")
     parser.add_argument("--orvpatch", type=Path, default=ROOT / "build/release/orvpatch", help="default: %(default)s")
+    parser.add_argument("--companion", action="store_true", help="measure orvpatchctl alone")
     parser.add_argument("--write", action="store_true", help="put the tables into docs/performance.md too")
     chosen = parser.parse_args()
     unknown = set(chosen.payloads.split(",")) - set(keys)
@@ -59,7 +62,7 @@ def conditions(file_system, bench, rounds):
     rows = [("date", f"{datetime.date.today()}"), ("processor", f"{os.cpu_count()} x {model}"),
             ("kernel", f"{platform.system()} {platform.release()}"), ("file system", file_system),
             ("rounds", rounds),
-            ("load before each run", f"{min(bench.loads):.2f} to {max(bench.loads):.2f}"),
+            ("load before each run", f"{min(bench.loads):.2f} to {max(bench.loads):.2f}" if bench.loads else "unknown"),
             *((program, version_of(program)) for program in PROGRAMS)]
     return "".join(f"| {name} | {value} |\n" for name, value in [("", ""), ("---", "---"), *rows])
 
@@ -81,6 +84,14 @@ def all_tables(first_table, trials):
                       *([f"### Growth\n\n{growth_table(growth)}"] if growth else [])])
 
 
+def companion_tables(trials):
+    if not trials:
+        return ""
+    rows = [goal.row() for goal in companion_goals(trials)]
+    return "\n".join([f"### Goals of orvpatchctl\n\n{table(['goal', 'at most', 'found', ''], rows)}",
+                      *map(companion_table, trials.values())])
+
+
 def write_into_document(tables):
     head = DOCUMENT.read_text(encoding="utf-8").partition(MARK)[0]
     DOCUMENT.write_text(f"{head}{MARK}\n{tables}", encoding="utf-8")
@@ -97,8 +108,14 @@ def main():
         progress(f"in memory: {file_system}")
         tempfile.tempdir = str(folder)
         bench = Bench(chosen.orvpatch.absolute(), folder, Meter(folder))
-        trials = {payload.key: bench.trial(payload, chosen.rounds, progress) for payload in chosen_payloads(chosen)}
-    tables = all_tables(conditions(file_system, bench, chosen.rounds), trials)
+        payloads = chosen_payloads(chosen)
+        trials = {payload.key: bench.trial(payload, chosen.rounds, progress)
+                  for payload in payloads if not chosen.companion}
+        companions = {payload.key: bench.companion_trial(payload, chosen.rounds, progress)
+                      for payload in payloads if payload.key in COMPANION}
+    first = conditions(file_system, bench, chosen.rounds)
+    tables = "\n".join(filter(None, [first if chosen.companion else all_tables(first, trials),
+                                     companion_tables(companions)]))
     print(tables, end="")
     if chosen.write:
         write_into_document(tables)

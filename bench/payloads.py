@@ -105,6 +105,11 @@ class Laid:
         if dict(_contents(self.home)) != expected:
             raise RuntimeError(f"{contender}: the home does not hold the payload ({self.payload.key})")
 
+    def verify_untouched(self, contender):
+        """Raises an error unless the home holds the files that it held before any run."""
+        if dict(_contents(self.home)) != dict(_contents(self.template)):
+            raise RuntimeError(f"{contender}: the home is not the one before ({self.payload.key})")
+
     def remove(self):
         shutil.rmtree(self.folder)
         shutil.rmtree(self.home)
@@ -112,6 +117,7 @@ class Laid:
     def _lay_out_template(self):
         home = ProductHome(self.template)
         home.detach()
+        (home.path / "tmp").chmod(0o700)  # as orvpatchctl asks for
         for code in self.payload.codes():
             home.component(code)
 

@@ -3,6 +3,7 @@
 import os
 from dataclasses import dataclass, field
 
+from companion import PEER, Companion
 from contenders import FLOOR, FLOOR_AT, PEERS, TOOL
 from payloads import Laid
 
@@ -23,6 +24,7 @@ class Bench:
     def __init__(self, tool, folder, meter):
         self._tool, self._folder, self._meter = tool, folder, meter
         self._floor = meter.build("floor")
+        self._companion = Companion(tool.parent / "orvpatchctl", meter)
         self.loads = []  # the machine's load before each run
 
     def trial(self, payload, rounds, progress):
@@ -40,6 +42,17 @@ class Bench:
         for name in (TOOL, FLOOR):
             laid.refresh()
             trial.system_calls[name] = self._meter.system_calls(commands[name])
+        laid.remove()
+        return trial
+
+    def companion_trial(self, payload, rounds, progress):
+        """The same for orvpatchctl."""
+        laid = Laid(payload, self._folder)
+        commands = {TOOL: [self._tool, "-h", laid.home, "-i", laid.path]}
+        peers = self._peer_commands(laid, Trial(payload))
+        if PEER in peers:
+            commands[PEER] = peers[PEER]
+        trial = self._companion.trial(laid, commands, rounds, progress)
         laid.remove()
         return trial
 
