@@ -55,7 +55,7 @@ private:
       lookAtVersionFile(line);
     else if (contains(line, "): unable to read RunInfo file") && access((home_ + RunInfo).c_str(), F_OK) == 0)
       failure_ = "cannot read " + home_ + RunInfo;
-    else if (contains(line, "): unable to running command"))
+    else if (contains(line, "): unable to running command") || contains(line, "): Error creating std"))
       failure_ = "cannot run ps";
     else if (contains(line, "): Error from readdir: ") ||
              contains(line, "): Unable to determine file/directory for path: "))

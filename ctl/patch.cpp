@@ -65,6 +65,8 @@ Patch readPatch(const std::string &path) {
   if (patch.hasDescriptor) {
     const MemoryFile descriptor(patch.descriptorText);
     patch.descriptor.reset(PatchDescriptor::parseFile(descriptor.path(), &patch.descriptorError));
+    if (patch.descriptor == nullptr && patch.descriptorError.code == PatchError::CannotReadFile)
+      throw JudgementError(patch.descriptorError.text); // the file in memory: no fault of the patch
   }
   return patch;
 }
