@@ -61,7 +61,7 @@ def is_mute(fault):
 
 def judge_apply(result, before, home, wanted, fault):
     """The status of the design, and what it promises."""
-    document = document_of(result)
+    document = document_of(result, fault)
     assert result.status in (0, 1, 2, 3, 4), result
     assert document or result.err or is_mute(fault), result
     if result.status == 0:
