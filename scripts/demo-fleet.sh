@@ -4,6 +4,10 @@
 # shellcheck shell=bash
 # shellcheck disable=SC2154  # checkout, folder, home and sample are those of scripts/demo
 
+"$checkout/scripts/setup" fleet
+mkdir archive
+"$checkout/packaging/collection" archive
+
 second=$folder/second
 trap '"$sample" stop "$second"; clean_up' EXIT
 mkdir "$second" user
@@ -15,8 +19,6 @@ export HOME=$folder/user ANSIBLE_LOCALHOST_WARNING=false ANSIBLE_NOCOWS=1 ANSIBL
 export ANSIBLE_DISPLAY_OK_HOSTS=no ANSIBLE_DISPLAY_SKIPPED_HOSTS=no LC_ALL=C.UTF-8
 
 heading "The collection is installed from its archive, and two hosts are written down"
-mkdir archive
-"$checkout/packaging/collection" archive
 shown 0 "installed successfully" ansible-galaxy collection install --offline archive/*.tar.gz
 cat >hosts.yml <<END
 all:
