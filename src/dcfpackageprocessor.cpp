@@ -132,8 +132,9 @@ bool DCFPackageProcessor::loadDirectory(const std::string &home, File &directory
 bool DCFPackageProcessor::loadEntry(const std::string &home, const File &file, PatchError *error) {
   LOG_INFO_MESSAGE("DCFPP_PROCESS_PATCH", file.getName().c_str());
   // A pipe or a device with a patch's name is ignored: reading an archive from it could wait for ever.
-  if (isSpecial(file.getPath()) || !isApplicable(home, file)) {
-    LOG_INFO_MESSAGE("DCFPP_NOT_APPLICABLE", file.getPath().c_str());
+  const std::string path = file.getPath();
+  if (isSpecial(path) || !isApplicable(home, file)) {
+    LOG_INFO_MESSAGE("DCFPP_NOT_APPLICABLE", path.c_str());
     return true;
   }
   if (!loadPatch(home, file, error))

@@ -398,7 +398,8 @@ void File::appendEntry(const std::string &name) {
 bool recursiveDelete(File *directory) {
   // A link that was planted in the tree must not empty a foreign directory: it goes straight to rmdir, which
   // refuses it.
-  if (!isLink(*directory) && !(deleteFiles(*directory) && deleteSubDirectories(*directory)))
+  const bool isReady = isLink(*directory) || (deleteFiles(*directory) && deleteSubDirectories(*directory));
+  if (!isReady)
     return false;
   const std::string path = directory->getAbsolutePath();
   if (rmdir(path.c_str()) != 0) {

@@ -27,6 +27,14 @@ int open(int directory, const std::string &name, HeldFile::Kind kind, bool &isLi
 
 } // namespace
 
+FileIdentity identityOf(const struct stat &status) {
+  return {status.st_dev, status.st_ino};
+}
+
+bool operator==(const FileIdentity &a, const FileIdentity &b) {
+  return a.device == b.device && a.inode == b.inode;
+}
+
 HeldFile::HeldFile(int directory, const std::string &name, Kind kind)
     : file_(open(directory, name, kind, isLink_)) {}
 

@@ -12,6 +12,14 @@
 
 #include "filedescriptor.h"
 
+/// What stays the same while names are exchanged.
+struct FileIdentity {
+  dev_t device;
+  ino_t inode;
+};
+FileIdentity identityOf(const struct stat &status);
+bool operator==(const FileIdentity &a, const FileIdentity &b);
+
 class HeldFile {
 public:
   enum class Kind { Regular, Directory, Other };

@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include <sys/types.h>
+#include "heldfile.h"
 
 class NewDirectories {
 public:
@@ -26,8 +26,7 @@ private:
   /// No descriptors: there may be more directories than those.
   struct Directory {
     std::string path;
-    dev_t device;
-    ino_t inode;
+    FileIdentity identity;
   };
   static void openToAll(const Directory &directory);
 

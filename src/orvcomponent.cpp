@@ -106,7 +106,8 @@ void ORVComponent::readRunInfoLine(const std::string &line, const std::string &s
   }
   // KEEP(host-prefix): more may follow the local name in the host of the line, such as a domain; so host1
   // also accepts the lines of host12.
-  if (!beginsWith(Util::toLower(fields[HostField]), hostName) || "k" + fields[CodeField] != name_)
+  const std::string host = Util::toLower(fields[HostField]);
+  if (!beginsWith(host, hostName) || "k" + fields[CodeField] != name_)
     return;
   const std::string instance = instanceName(fields[CodeField], fields[InstanceField]);
   std::string owner;
@@ -149,9 +150,11 @@ bool ORVComponent::start(const std::string &instance, PatchError *err) {
   const std::string user = Util::getUserName();
   std::vector<std::string> command = {"/bin/sh", "-c"};
   if (!owner.empty() && owner != user) {
-    if (user != "root")
-      return err != nullptr &&
-             FAILURE(err, PatchError::CannotSwitchUser, "ERROR_START_CANT_SU", owner.c_str());
+    if (user != "root") {
+      if (err != nullptr)
+        FAILURE(err, PatchError::CannotSwitchUser, "ERROR_START_CANT_SU", owner.c_str());
+      return false;
+    }
     command = {"/bin/su", "-", owner, "-c"};
   }
   command.push_back(startCommandLine(instance));

@@ -71,7 +71,9 @@ VersionFile parseVersionFile(const std::vector<std::string> &lines) {
 /// Between the product code and the extension; empty without one.
 std::string archOf(const std::string &fileName) {
   const std::size_t point = fileName.rfind('.');
-  return point == std::string::npos || point < 2 ? "" : fileName.substr(2, point - 2);
+  if (point == std::string::npos || point < 2)
+    return "";
+  return fileName.substr(2, point - 2);
 }
 
 bool isVersionFile(const std::string &fileName) {
@@ -154,7 +156,7 @@ ORVComponent *ORVComponentRegistry::getInstalledComponent(const std::string &nam
                                                           ORVComponent::Type type) const {
   LOG_TRACE("ORVComponentRegistry::getInstalledComponent %s", "entry");
   ORVComponent *const found = findFirst([&](const ORVComponent &component) {
-    return component.getName() == name && component.getType() == type;
+    return component.getType() == type && component.getName() == name;
   });
   LOG_TRACE("ORVComponentRegistry::getInstalledComponent %s", "exit");
   return found;
@@ -165,7 +167,7 @@ ORVComponent *ORVComponentRegistry::getInstalledComponentByArch(const std::strin
                                                                 const std::string &arch) const {
   LOG_TRACE("ORVComponentRegistry::getInstalledComponentByArch %s", "entry");
   ORVComponent *const found = findFirst([&](const ORVComponent &component) {
-    return component.getName() == name && component.getType() == type && component.getArch() == arch;
+    return component.getType() == type && component.getName() == name && component.getArch() == arch;
   });
   LOG_TRACE("ORVComponentRegistry::getInstalledComponentByArch %s", "exit");
   return found;

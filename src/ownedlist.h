@@ -12,7 +12,7 @@ public:
   OwnedList &operator=(const OwnedList &) = delete;
   ~OwnedList() {
     for (T *item : items_)
-      delete item;
+      delete item; // GCOVR_EXCL_BR_LINE: none is null
   }
 
   void append(std::unique_ptr<T> item) {

@@ -86,7 +86,7 @@ bool PatchDescriptor::buildSections(const IniFile *ini, PatchError *err) {
     const Section *const section = ini->getSection(optional.name);
     // KEEP(no-section-after-failure): after a failure, existing sections are traced as missing too.
     if (result && section != nullptr)
-      result = (this->*optional.build)(section, err);
+      result = (this->*optional.build)(section, err); // GCOVR_EXCL_BR_LINE: none of these is virtual
     else
       LOG_TRACE("No %s section found", optional.missingName);
   }
@@ -130,8 +130,10 @@ bool PatchDescriptor::buildInfoSection(const Section *section, PatchError *err) 
                                {"productVer", &ver},       {"productRel", &rel},
                                {"productMod", &mod},       {"productLvl", &lvl}};
   // A missing key does not end the search: the record names the last one.
-  for (const Required &property : required)
-    result = getSectionProperty(section, property.key, *property.value, err) && result;
+  for (const Required &property : required) {
+    const bool found = getSectionProperty(section, property.key, *property.value, err);
+    result = result && found;
+  }
   version_ = std::make_unique<Version>(ver.c_str(), rel.c_str(), mod.c_str(), lvl.c_str());
 
   if (!getSectionProperty(section, "productBinArch", arch_, err)) {

@@ -11,7 +11,7 @@ class PatchFileName {
 public:
   /// `name` is the bare name, without a directory. Parts after the first fault stay empty.
   explicit PatchFileName(const std::string &name);
-  PatchFileName(const PatchFileName &other) = default;
+  PatchFileName(const PatchFileName &other) = default; // GCOVR_EXCL_BR_LINE: exceptions alone
   PatchFileName &operator=(const PatchFileName &other) = default;
   virtual ~PatchFileName() = default;
 

@@ -49,8 +49,7 @@ public:
 private:
   /// A directory on the way down.
   struct Level {
-    dev_t device;
-    ino_t inode;
+    FileIdentity identity;
     mode_t mode;   ///< as it was found
     bool isOpened; ///< its owner lacked a permission
     Names subDirectories;
@@ -84,7 +83,7 @@ void Sweep::enter(int directory, const std::string &name) {
   struct stat status = {};
   if (!held.look(status))
     return;
-  Level level = {status.st_dev, status.st_ino, status.st_mode & 07777, false, {}};
+  Level level = {identityOf(status), status.st_mode & 07777, false, {}};
   level.isOpened = (level.mode & 0700) != 0700 && held.setMode(level.mode | 0700);
   FileDescriptor entered(openat(directory, name.c_str(), Reading | O_NOFOLLOW));
   if (!entered.isOpen()) {
@@ -109,8 +108,9 @@ void Sweep::leave() {
     static_cast<void>(fchmod(current_.get(), left.mode));
   current_ = std::move(above);
   struct stat status = {};
-  if (!levels_.empty() && (fstat(current_.get(), &status) != 0 || status.st_dev != levels_.back().device ||
-                           status.st_ino != levels_.back().inode))
+  const bool isBack = levels_.empty() ||
+                      (fstat(current_.get(), &status) == 0 && identityOf(status) == levels_.back().identity);
+  if (!isBack)
     levels_.clear();
 }
 

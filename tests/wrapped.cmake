@@ -11,6 +11,7 @@ set(wrapped_calls
   fchown
   fcntl
   fork
+  fstatat
   fsync
   ftruncate
   getcwd

@@ -10,6 +10,7 @@
 #include <sys/stat.h>
 
 #include "failure.h"
+#include "heldfile.h"
 #include "newdirectories.h"
 #include "patchprocessor/workingdirectory.h"
 #include "signalguard.h"
@@ -21,10 +22,6 @@ namespace {
 
 constexpr const char *UpdatedFiles = "/updated_files";
 
-bool isSameDirectory(const struct stat &a, const struct stat &b) {
-  return a.st_dev == b.st_dev && a.st_ino == b.st_ino;
-}
-
 /// Whether the directory is a link to one above it. Entering it would repeat the walk, and two such links
 /// would double it at each of the 40 levels that the system follows.
 bool leadsBack(const std::string &path) {
@@ -35,7 +32,8 @@ bool leadsBack(const std::string &path) {
     return false;
   for (std::size_t slash = path.find('/'); slash < name.size(); slash = path.find('/', slash + 1)) {
     struct stat above = {};
-    if (stat(path.substr(0, slash).c_str(), &above) == 0 && isSameDirectory(above, directory))
+    const std::string nameAbove = path.substr(0, slash);
+    if (stat(nameAbove.c_str(), &above) == 0 && identityOf(above) == identityOf(directory))
       return true;
   }
   return false;
@@ -77,9 +75,8 @@ bool makeTargetDirectory(const std::string &path, const Walk &walk) {
   return walk.err == nullptr;
 }
 
-bool installFile(File &file, const Walk &walk) {
+bool installFile(File &file, const std::string &destination, const Walk &walk) {
   const std::string source = file.getAbsolutePath(walk.directory);
-  const std::string destination = walk.home + file.getPath();
   if (!file.moveFile(destination, true))
     return FAILURE(walk.err, PatchError::CannotMoveFile, "ERROR_PP_MOVE_FILE", source.c_str(),
                    destination.c_str());
@@ -90,11 +87,10 @@ bool installFile(File &file, const Walk &walk) {
 /// Moves an entry, with everything below it.
 bool moveTree(File &entry, const Walk &walk) {
   LOG_TRACE("PatchProcessor::moveFile() %s", "entry");
-  bool result = false;
-  if (entry.isDirectory())
-    result = makeTargetDirectory(walk.home + entry.getPath(), walk) && visitEntries(entry, walk, moveTree);
-  else
-    result = installFile(entry, walk);
+  const std::string destination = walk.home + entry.getPath();
+  const bool result = entry.isDirectory()
+                          ? makeTargetDirectory(destination, walk) && visitEntries(entry, walk, moveTree)
+                          : installFile(entry, destination, walk);
   LOG_TRACE("PatchProcessor::moveFile() %s", "exit");
   return result;
 }
@@ -129,7 +125,8 @@ bool PatchProcessor::moveFiles(PatchError *err) {
   mayHaveMoved_ = true;
   File root(".");
   bool result = moveFile(&root, err);
-  result = workingDirectory.leave(err) && result;
+  if (!workingDirectory.leave(err))
+    result = false;
   // KEEP(movefiles-exit-name): the result line names the operation without its "s".
   LOG_TRACE("PatchProcessor::moveFile() = %d", result);
   return result;
@@ -157,7 +154,8 @@ bool PatchProcessor::listFiles(PatchError *err) {
     printf("\n%s\n", heading.c_str());
     File root(".");
     result = listFile(&root, err);
-    result = workingDirectory.leave(err) && result;
+    if (!workingDirectory.leave(err))
+      result = false;
   }
   printf("\n");
   LOG_TRACE("PatchProcessor::listFiles() %s", "exit");

@@ -29,7 +29,7 @@ bool PatchProcessor::run(PatchError *err) {
                 && stopDependents(err)
                 && runPreScripts(err)
                 && moveFiles(err)
-                && updateProductEXEFiles(err)
+                && updateProductEXEFiles(err) // GCOVR_EXCL_BR_LINE: a placeholder, which always succeeds
                 && runPostScripts(err)
                 && updatePatchVerFile(err)
                 && startDependents(err);
@@ -50,7 +50,9 @@ bool PatchProcessor::testRun(PatchError *err) {
   printf("\n");
   static_cast<void>(printDependentsList(err)); // it cannot fail the report
   printCommands(descriptor_->getPreCommands(), "PP_TEST_PRESCRIPT", "PP_TEST_NO_PRESCRIPT");
-  const bool result = extract(err) && listFiles(err) && listProductEXEFiles(err);
+  bool result = extract(err) && listFiles(err);
+  if (result)
+    result = listProductEXEFiles(err);
   if (result) {
     printCommands(descriptor_->getPostCommands(), "PP_TEST_POSTSCRIPT", "PP_TEST_NO_POSTSCRIPT");
     printf("\n");
@@ -154,7 +156,9 @@ bool PatchProcessor::runTar(const std::vector<std::string> &members, const std::
   LOG_TRACE("tar returned: %d", tar.rc);
   LOG_TRACE("stdout: %s", tar.out.c_str());
   LOG_TRACE("stderr: %s", tar.err.c_str());
-  return tar.rc == 0 || FAILURE(err, PatchError::CannotExtract, "PROC_BAD_RC", "tar -xf", tar.rc);
+  if (tar.rc != 0)
+    return FAILURE(err, PatchError::CannotExtract, "PROC_BAD_RC", "tar -xf", tar.rc);
+  return true;
 }
 
 bool PatchProcessor::parsePatchDescriptor(PatchError *err) {
@@ -171,8 +175,9 @@ bool PatchProcessor::parsePatchDescriptor(PatchError *err) {
 bool PatchProcessor::cleanUp(PatchError *err) {
   LOG_TRACE("PatchProcessor::cleanUp() %s", "entry");
   const std::string directory = tempDir();
-  const bool result = File(directory).rmdir() ||
-                      FAILURE(err, PatchError::CannotRemoveDirectory, "ERROR_PP_RM_DIR", directory.c_str());
+  const bool result = File(directory).rmdir();
+  if (!result)
+    FAILURE(err, PatchError::CannotRemoveDirectory, "ERROR_PP_RM_DIR", directory.c_str());
   LOG_TRACE("PatchProcessor::cleanUp() = %d", result);
   return result;
 }

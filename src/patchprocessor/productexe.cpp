@@ -24,7 +24,8 @@ std::string baseOf(const std::string &name) {
 /// The name of a copy begins like the executable's and has the same extension, ignoring case.
 bool isCopyOf(const std::string &exe, const std::string &name) {
   const std::string lowerName = Util::toLower(name);
-  return lowerName.rfind(baseOf(exe), 0) == 0 && lowerName != exe && extensionOf(name) == extensionOf(exe);
+  const std::string base = baseOf(exe);
+  return lowerName.rfind(base, 0) == 0 && lowerName != exe && extensionOf(name) == extensionOf(exe);
 }
 
 void findCopies(const std::string &exe, std::vector<File *> &found) {

@@ -8,8 +8,9 @@
 namespace {
 
 bool change(const std::string &directory, PatchError *err) {
-  return Util::setCurrentDirectory(directory) ||
-         FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", directory.c_str());
+  if (!Util::setCurrentDirectory(directory))
+    return FAILURE(err, PatchError::CannotChangeDirectory, "ERROR_PP_SET_CWD", directory.c_str());
+  return true;
 }
 
 } // namespace

@@ -136,6 +136,7 @@ int __real_lstat(const char *path, struct stat *status);
 int __real_openat(int directory, const char *path, int flags, ...);
 int __real_fchown(int descriptor, uid_t owner, gid_t group);
 int __real_fchmod(int descriptor, mode_t mode);
+int __real_fstatat(int directory, const char *path, struct stat *status, int flags);
 int __real_ftruncate(int descriptor, off_t length);
 int __real_syncfs(int descriptor);
 int __real_link(const char *source, const char *target);
@@ -248,6 +249,10 @@ int __wrap_openat(int directory, const char *path, int flags, ...) {
 
 int __wrap_fchown(int descriptor, uid_t owner, gid_t group) {
   return fails("fchown") ? -1 : __real_fchown(descriptor, owner, group);
+}
+
+int __wrap_fstatat(int directory, const char *path, struct stat *status, int flags) {
+  return fails("fstatat", path) ? -1 : __real_fstatat(directory, path, status, flags);
 }
 
 int __wrap_fchmod(int descriptor, mode_t mode) {

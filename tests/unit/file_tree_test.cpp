@@ -198,6 +198,13 @@ TEST_F(MkdirTest, FileInTheWayEndsItAtOnce) {
   EXPECT_EQ(logLines(), mkdirTraces({creating("file/")}, false));
 }
 
+TEST_F(MkdirTest, FileBehindAWayBackEndsItToo) {
+  write("file", "kept");
+  EXPECT_FALSE(File("c/../file/a").mkdir());
+  EXPECT_TRUE(fs::is_directory("c"));
+  EXPECT_EQ(read(home() + "file"), "kept");
+}
+
 TEST_F(MkdirTest, ParentsMadeBeforeTheFailureStay) {
   const std::string tooLong(300, 'n');
   File directory("a/" + tooLong + "/c");

@@ -3,6 +3,7 @@
 
 #include <cerrno>
 #include <string>
+#include <utility>
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -38,6 +39,13 @@ TEST_F(FileDescriptorTest, WhatCannotBeOpenedTakesNoPartInAnything) {
   EXPECT_FALSE(file.write("text"));
   EXPECT_EQ(errno, EBADF);
   EXPECT_EQ(readAll(file), "failed");
+}
+
+TEST_F(FileDescriptorTest, AssignmentToItselfKeepsItOpen) {
+  FileDescriptor file(home().c_str(), O_RDONLY);
+  FileDescriptor &same = file;
+  file = std::move(same);
+  EXPECT_TRUE(file.isOpen());
 }
 
 TEST_F(FileDescriptorTest, ClosesOnce) {

@@ -102,6 +102,13 @@ TEST_F(NewDirectoriesTest, WayThroughALinkedParentLeadsToNoForeignDirectory) {
   EXPECT_EQ(modeOf(path("foreign/b")), 0700U);
 }
 
+TEST_F(NewDirectoriesTest, DirectoryThatIsNoLongerClosedIsLeftAlone) {
+  EXPECT_TRUE(make(path("new")));
+  ASSERT_EQ(chmod(path("new").c_str(), 0710), 0);
+  open();
+  EXPECT_EQ(modeOf(path("new")), 0710U);
+}
+
 TEST_F(NewDirectoriesTest, DirectoryOfAnotherOwnerIsLeftAlone) {
   REQUIRE_ROOT();
   EXPECT_TRUE(make(path("new")));

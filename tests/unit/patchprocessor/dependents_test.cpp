@@ -107,12 +107,12 @@ TEST_P(AimTest, AgentAndFourthKindPatchesAndThoseOfTheTwoServersHaveDependents) 
 
 INSTANTIATE_TEST_SUITE_P(
     Targets, AimTest,
-    ::testing::Values(Aim{"kxe_lpp266_vema_1.tar", "kxe", true}, Aim{"kzt_lpp266_vecm_1.tar", "kzt", true},
-                      Aim{"kxe_lpp266_vecm_1.tar", "kxe", true}, Aim{"kox_lpp266_vems_1.tar", "kox", false},
-                      Aim{"kxe_lpp266_veps_1.tar", "kxe", false}, Aim{"kdk_lpp266_vepd_1.tar", "kdk", false},
-                      Aim{"kqa_lpp266_vems_1.tar", "kqa", true}, Aim{"kpt_lpp266_veps_1.tar", "kpt", true},
-                      Aim{"kqa_lpp266_vepd_1.tar", "kpt", true}, Aim{"kqa_lpp266_vems_1.tar", "kox", false},
-                      Aim{"kox_lpp266_vems_1.tar", "kqa", true}));
+    ::testing::Values(Aim{"kxe_lpp266_vemx_1.tar", "kxe", false}, Aim{"kxe_lpp266_vema_1.tar", "kxe", true},
+                      Aim{"kzt_lpp266_vecm_1.tar", "kzt", true}, Aim{"kxe_lpp266_vecm_1.tar", "kxe", true},
+                      Aim{"kox_lpp266_vems_1.tar", "kox", false}, Aim{"kxe_lpp266_veps_1.tar", "kxe", false},
+                      Aim{"kdk_lpp266_vepd_1.tar", "kdk", false}, Aim{"kqa_lpp266_vems_1.tar", "kqa", true},
+                      Aim{"kpt_lpp266_veps_1.tar", "kpt", true}, Aim{"kqa_lpp266_vepd_1.tar", "kpt", true},
+                      Aim{"kqa_lpp266_vems_1.tar", "kox", false}, Aim{"kox_lpp266_vems_1.tar", "kqa", true}));
 
 TEST_F(DependentsTest, PatchWithoutDependentsStopsNothingThatRuns) {
   installAgents({"ox"});

@@ -65,6 +65,7 @@ INSTANTIATE_TEST_SUITE_P(
                       VersionFile{"kdk_lpp266_vepd_1.tar", "kdk", "dklpp266.ver"},
                       VersionFile{"kzt_lpp266_vecm_1.tar", "kzt", "ztlpp266.ver"},
                       VersionFile{"kxe_lpp266_vecm_1.tar", "kxe", "ztlpp266.ver"},
+                      VersionFile{"kxe_lpp266_vemx_1.tar", "kxe", "xelpp266.ver"},
                       // The product is that of the descriptor, whatever the file name says.
                       VersionFile{"kxe_lpp266_vema_1.tar", "kox", "oxlpp266.ver"}));
 

@@ -58,6 +58,15 @@ protected:
   }
 };
 
+TEST_F(FileFailureTest, LinkMovesWhenTheModeOfItsDestinationCannotBeSet) {
+  write("destination", "text");
+  fs::create_symlink(home() + "destination", source());
+  failCall("chmod", EPERM);
+  File link(source());
+  EXPECT_TRUE(link.moveFile(target(), true));
+  EXPECT_TRUE(fs::is_symlink(target()));
+}
+
 TEST_F(FileFailureTest, OnlyMissingPathsAreNotLogged) {
   const std::string path = write("file", "");
   failCall("stat", ENOENT).on(path).times(1);

@@ -243,6 +243,26 @@ INSTANTIATE_TEST_SUITE_P(Calls, VersionOnDiskTest,
                                            LateFailure{"close", 6}),
                          [](const auto &test) { return test.param.call; });
 
+class HistoryOnDiskTest : public RefusedTest, public ::testing::WithParamInterface<LateFailure> {};
+
+TEST_P(HistoryOnDiskTest, FailureIsLoggedWithItsReason) {
+  const Processor kxe = processor();
+  ownLines();
+  restoreSystemCalls();
+  failCall(GetParam().call, EIO).after(GetParam().after).times(1);
+  kxe->updatePatchRegistry(true);
+  EXPECT_EQ(ownLines(), (LogLines{pp("PatchProcessor::updatePatchRegistry() entry"),
+                                  ppError("Unable to update patch history file, " + home() +
+                                          "patchlogs/patches.hist: Input/output error"),
+                                  pp("PatchProcessor::updatePatchRegistry() exit")}));
+}
+
+// Before the write and the close of the history come those of one line of the log.
+INSTANTIATE_TEST_SUITE_P(Calls, HistoryOnDiskTest,
+                         ::testing::Values(LateFailure{"write", 1}, LateFailure{"fsync", 0},
+                                           LateFailure{"close", 1}),
+                         [](const auto &test) { return test.param.call; });
+
 TEST_F(RefusedTest, FilesMoveWhenTheDiskCannotBeToldToWriteFirst) {
   write("tmp/kxe/updated_files/bin/agent", "new");
   const Processor kxe = processor();
