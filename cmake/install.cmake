@@ -64,7 +64,7 @@ install(FILES completions/_orvpatch
   DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions COMPONENT debian EXCLUDE_FROM_ALL)
 install(FILES packaging/copyright ${changelog} ${changelog_debian}
   DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT debian EXCLUDE_FROM_ALL)
-install(FILES packaging/lintian-overrides
+install(FILES packaging/orvpatch.lintian-overrides
   DESTINATION ${CMAKE_INSTALL_DATADIR}/lintian/overrides RENAME orvpatch COMPONENT debian EXCLUDE_FROM_ALL)
 
 add_custom_target(shared_files ALL DEPENDS ${shared_files})

@@ -10,7 +10,13 @@ install(FILES completions/orvpatchctl.bash
   DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions RENAME orvpatchctl COMPONENT ctl)
 install(FILES completions/orvpatchctl.fish
   DESTINATION ${CMAKE_INSTALL_DATADIR}/fish/vendor_completions.d COMPONENT ctl)
-install(DIRECTORY docs/schema DESTINATION ${ctl_doc} COMPONENT ctl FILES_MATCHING PATTERN "*.json")
+file(GLOB schemas CONFIGURE_DEPENDS docs/schema/*.json)
+install(FILES ${schemas} DESTINATION ${ctl_doc}/schema COMPONENT ctl)
+# Their licences ask for it: the code of the two header libraries is in the program.
+foreach(library libcli11-dev nlohmann-json3-dev)
+  install(FILES ${ORVPATCH_SYSROOT}/usr/share/doc/${library}/copyright
+    DESTINATION ${ctl_doc}/notices RENAME ${library} COMPONENT ctl)
+endforeach()
 
 install(FILES completions/_orvpatchctl
   DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/site-functions COMPONENT ctl-site)
@@ -20,5 +26,7 @@ install(FILES completions/_orvpatchctl
   DESTINATION ${CMAKE_INSTALL_DATADIR}/zsh/vendor-completions COMPONENT ctl-debian EXCLUDE_FROM_ALL)
 install(FILES packaging/copyright ${changelog} ${changelog_debian}
   DESTINATION ${ctl_doc} COMPONENT ctl-debian EXCLUDE_FROM_ALL)
+install(FILES packaging/orvpatchctl.lintian-overrides
+  DESTINATION ${CMAKE_INSTALL_DATADIR}/lintian/overrides RENAME orvpatchctl COMPONENT ctl-debian EXCLUDE_FROM_ALL)
 
 add_custom_target(ctl_files ALL DEPENDS ${ctl_page})

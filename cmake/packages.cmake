@@ -1,5 +1,6 @@
-# The packages: .deb, .rpm and .tar.gz. Which a build makes, and how their names are spelt, depends on the
-# processor; big-endian POWER is only tested, so nothing is packaged for it.
+# The packages: .deb, .rpm and .tar.gz, of orvpatch and, where it is built, of orvpatchctl: cpack makes those of
+# CPACK_ORVPATCH_PROGRAM. Which kinds a build makes, and how their names are spelt, depends on the processor;
+# big-endian POWER is only tested, so nothing is packaged for it.
 
 if(CMAKE_SYSTEM_PROCESSOR STREQUAL ppc64le)
   set(CPACK_GENERATOR DEB RPM External)
@@ -15,21 +16,30 @@ endif()
 # The debug symbols are packed apart: the packages hold a stripped program.
 target_compile_options(orvpatch_core PRIVATE -g)
 target_compile_options(orvpatch PRIVATE -g)
+set(programs orvpatch)
+if(ORVPATCH_CTL)
+  target_compile_options(orvpatchctl_core PRIVATE $<$<NOT:$<CONFIG:Debug>>:-g>)
+  target_compile_options(orvpatchctl PRIVATE $<$<NOT:$<CONFIG:Debug>>:-g>)
+  list(APPEND programs orvpatchctl)
+endif()
 
-# The C library's level that the program asks for, kept beside it for the packages to name.
-add_custom_command(TARGET orvpatch POST_BUILD VERBATIM
-  COMMAND ${CMAKE_SOURCE_DIR}/packaging/libc-level ${CMAKE_OBJDUMP} $<TARGET_FILE:orvpatch> > libc-level
-  BYPRODUCTS libc-level)
+# The C library's level that a program asks for, kept beside it for the packages to name.
+foreach(program ${programs})
+  set(level ${CMAKE_BINARY_DIR}/${program}.libc-level)
+  add_custom_command(OUTPUT ${level}
+    COMMAND ${CMAKE_SOURCE_DIR}/packaging/libc-level ${CMAKE_OBJDUMP} $<TARGET_FILE:${program}> > ${level}
+    DEPENDS ${program} VERBATIM)
+  list(APPEND levels ${level})
+endforeach()
+add_custom_target(libc_levels ALL DEPENDS ${levels})
 
-set(CPACK_PACKAGE_NAME orvpatch)
+set(CPACK_ORVPATCH_PROGRAM orvpatch)
+set(CPACK_ORVPATCH_PROCESSOR ${CMAKE_SYSTEM_PROCESSOR})
 set(CPACK_PACKAGE_VENDOR "Norvik")
 set(CPACK_PACKAGE_CONTACT "${ORVPATCH_MAINTAINER}")
-set(CPACK_PACKAGE_DESCRIPTION_SUMMARY "patch installer of the ORV monitoring product")
-set(CPACK_PACKAGE_DESCRIPTION_FILE ${CMAKE_SOURCE_DIR}/packaging/description)
 set(CPACK_PACKAGE_VERSION ${ORVPATCH_PACKAGE_VERSION})
-set(CPACK_PACKAGE_FILE_NAME orvpatch-${ORVPATCH_PACKAGE_VERSION}-linux-${CMAKE_SYSTEM_PROCESSOR})
 set(CPACK_PACKAGE_DIRECTORY ${CMAKE_BINARY_DIR}/packages)
-# Settings that differ by the kind of package, and what is done to the files before they are packed.
+# Settings that differ by program and kind of package, and what is done to the files before they are packed.
 set(CPACK_PROJECT_CONFIG_FILE ${CMAKE_SOURCE_DIR}/packaging/kinds.cmake)
 set(CPACK_PRE_BUILD_SCRIPTS ${CMAKE_SOURCE_DIR}/packaging/staged.cmake)
 set(CPACK_ORVPATCH_STRIP ${CMAKE_STRIP})
@@ -57,9 +67,6 @@ foreach(folder sbin share/bash-completion share/bash-completion/completions shar
   list(APPEND CPACK_RPM_EXCLUDE_FROM_AUTO_FILELIST_ADDITION /usr/${folder})
 endforeach()
 set(CPACK_RPM_CHANGELOG_FILE ${CMAKE_BINARY_DIR}/changelog.rpm)
-# The programs that orvpatch runs: ps by the name of its package on either family, since other makes of it lack
-# -p; su is in util-linux.
-set(CPACK_RPM_PACKAGE_REQUIRES "(procps-ng or procps), tar, grep, util-linux")
 file(READ packaging/rpm-defines defines)
 string(APPEND CPACK_RPM_SPEC_MORE_DEFINE "${defines}%define packager ${ORVPATCH_MAINTAINER}\n")
 

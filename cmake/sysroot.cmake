@@ -18,7 +18,9 @@ function(orvpatch_sysroot preset triplet)
   set(compile --sysroot=${sysroot} -ffile-prefix-map=${sysroot}=./build/sysroot/${preset}
     -Wno-uninitialized -Wno-maybe-uninitialized -nostdinc
     -isystem${headers}/c++/10 -isystem${headers}/c++/10/${triplet} -isystem${compiler_headers} -isystem${headers})
-  set(link --sysroot=${sysroot} -B${sysroot}/usr/lib/gcc-cross/${triplet}/10 -B${sysroot}/usr/${triplet}/lib)
+  # libarchive's own libraries are the host's.
+  set(link --sysroot=${sysroot} -B${sysroot}/usr/lib/gcc-cross/${triplet}/10 -B${sysroot}/usr/${triplet}/lib
+    -Wl,--allow-shlib-undefined)
   string(JOIN "\" \"" compile ${compile}) # quoted: the path may have blanks
   string(JOIN "\" \"" link ${link})
   # Set at each configuration, not only at the first: another list of packages may bring other flags.
@@ -26,4 +28,12 @@ function(orvpatch_sysroot preset triplet)
   set(CMAKE_CXX_FLAGS "\"${compile}\"" PARENT_SCOPE)
   set(CMAKE_EXE_LINKER_FLAGS "\"${link}\"" PARENT_SCOPE)
   set(ORVPATCH_SYSROOT ${sysroot} PARENT_SCOPE)
+
+  # The libraries of orvpatchctl: headers, and the shared library of the processor, which need not be that of the
+  # package with the headers.
+  set(CMAKE_FIND_ROOT_PATH ${CMAKE_FIND_ROOT_PATH} ${sysroot} PARENT_SCOPE)
+  set(CMAKE_FIND_ROOT_PATH_MODE_INCLUDE ONLY PARENT_SCOPE)
+  set(CMAKE_FIND_ROOT_PATH_MODE_PACKAGE ONLY PARENT_SCOPE)
+  set(LibArchive_INCLUDE_DIR ${sysroot}/usr/include CACHE PATH "Headers of libarchive" FORCE)
+  set(LibArchive_LIBRARY ${sysroot}/usr/lib/${triplet}/libarchive.so.13 CACHE FILEPATH "libarchive" FORCE)
 endfunction()

@@ -1,7 +1,7 @@
 # Run by cpack when the files of a package stand in their places.
 
 set(staged ${CPACK_TEMPORARY_DIRECTORY})
-file(GLOB program ${staged}/sbin/orvpatch ${staged}/usr/sbin/orvpatch)
+file(GLOB program ${staged}/sbin/* ${staged}/usr/sbin/*)
 execute_process(
   COMMAND ${CPACK_ORVPATCH_STRIP} --strip-all --remove-section=.comment --preserve-dates ${program}
   COMMAND_ERROR_IS_FATAL ANY)

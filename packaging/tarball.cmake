@@ -19,7 +19,7 @@ set(symbols ${build}/debug-symbols)
 file(REMOVE_RECURSE ${symbols})
 execute_process(
   COMMAND ${CMAKE_CURRENT_LIST_DIR}/debug-symbols ${CPACK_ORVPATCH_OBJCOPY} ${CPACK_ORVPATCH_READELF}
-          ${build}/orvpatch ${symbols}
+          ${build}/${CPACK_ORVPATCH_PROGRAM} ${symbols}
   COMMAND_ERROR_IS_FATAL ANY)
 orvpatch_tarball(${symbols} ${CPACK_PACKAGE_FILE_NAME}-debug)
 orvpatch_tarball(${CPACK_TEMPORARY_DIRECTORY} ${CPACK_PACKAGE_FILE_NAME})

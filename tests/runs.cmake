@@ -38,7 +38,7 @@ endfunction()
 function(orvpatch_build preset)
   orvpatch_words(${ARGN} PROCESSORS 2 COST 1000)
   orvpatch_add(build.${preset} ${CMAKE_COMMAND} --workflow --preset ${preset})
-  set_tests_properties(build.${preset} PROPERTIES FIXTURES_SETUP ${preset})
+  set_tests_properties(build.${preset} PROPERTIES FIXTURES_SETUP ${preset} TIMEOUT 5400)
 endfunction()
 
 # orvpatch_pytest(NAME ...): the Python tests below these paths of tests/.
@@ -172,13 +172,27 @@ orvpatch_pytest(target.cases ${target} ENV "ORVPATCH_RUNNER=/usr/bin/qemu-ppc64l
   PATHS cases PARTS 4 COST 100)
 orvpatch_pytest(target.same ${target} ENV "ORVPATCH_RUNNER=/usr/bin/qemu-ppc64le -L /usr/powerpc64le-linux-gnu"
   ORVPATCH_NATIVE=${builds}/release/orvpatch ORVPATCH_TARGET=${builds}/ppc64le/orvpatch PATHS target PARTS 3 COST 60)
+# libarchive asks for a newer C library: orvpatchctl runs with one of its own folder, and so does the installer
+# beside it. apply and undo run the installer by themselves, which takes a packaged program (label packages).
+orvpatch_test(build.ppc64le-run LABELS target COMMAND packaging/sysroot ppc64le-run)
+set_tests_properties(build.ppc64le-run PROPERTIES FIXTURES_SETUP ppc64le-run)
+set(run_libraries ${builds}/sysroot/ppc64le-run)
+set(target_ctl LABELS target NEEDS ppc64le ppc64le-run TREE ${builds}/ppc64le)
+orvpatch_test(target.ctl_unit ${target_ctl} COST 60 UNDER qemu-ppc64le -L ${run_libraries}
+  COMMAND ${builds}/ppc64le/tests/ctl_unit_tests --gtest_brief=1 --gtest_output=xml:${results}/target.ctl_unit.xml)
+orvpatch_pytest(target.ctl ${target_ctl} ENV "ORVPATCH_RUNNER=/usr/bin/qemu-ppc64le -L '${run_libraries}'"
+  PARTS 2 COST 80 PATHS ctl/test_build.py ctl/test_history.py ctl/test_lint.py ctl/test_log.py ctl/test_show.py
+  ctl/test_status.py ctl/test_verify.py)
 orvpatch_build(ppc64 LABELS bigendian)
 orvpatch_units(bigendian LABELS bigendian NEEDS ppc64 TREE ${builds}/ppc64 PARTS 2
   UNDER qemu-ppc64 -L /usr/powerpc64-linux-gnu)
 
+# Each program twice for each processor, which the tests then find.
+orvpatch_test(build.shipped LABELS packages PROCESSORS 2 COST 1000 COMMAND ${python} tests/packaging/shipped.py)
+set_tests_properties(build.shipped PROPERTIES FIXTURES_SETUP shipped TIMEOUT 7200)
 foreach(file ${files})
   if(file MATCHES "^(bench|packaging)/test_(.*)\\.py$")
-    orvpatch_pytest(packages.${CMAKE_MATCH_2} PATHS ${file} LABELS packages NEEDS release TREE ${builds}/release
+    orvpatch_pytest(packages.${CMAKE_MATCH_2} PATHS ${file} LABELS packages NEEDS release shipped TREE ${builds}/release
       LOCK shipped COST 90)
   endif()
 endforeach()

@@ -2,11 +2,11 @@
 
 import pytest
 
-from shipped import ARCHITECTURES, ship
+from shipped import ARCHITECTURES, PROGRAMS, first_build, second_build
 
 
 def pytest_configure(config):
-    config.addinivalue_line("markers", "packages: builds the packages first, which takes half a minute")
+    config.addinivalue_line("markers", "packages: builds the packages first, which takes minutes")
 
 
 @pytest.fixture(params=ARCHITECTURES, ids=lambda architecture: architecture.preset)
@@ -14,11 +14,17 @@ def architecture(request):
     return request.param
 
 
+@pytest.fixture(params=PROGRAMS)
+def name(request):
+    """Of the program whose package is looked at."""
+    return request.param
+
+
 @pytest.fixture
 def build(architecture):
-    return ship(architecture, "a", 0o022, TZ="UTC", LC_ALL="C")
+    return first_build(architecture)
 
 
 @pytest.fixture
 def other_build(architecture):
-    return ship(architecture, "another-folder/with/a-longer-name", 0o027, TZ="Asia/Tokyo", LC_ALL="C.UTF-8")
+    return second_build(architecture)

@@ -1,4 +1,6 @@
-"""Builds what is shipped, in folders of its own under build/shipped, from copies of the sources."""
+"""Builds what is shipped, in folders of its own under build/shipped, from copies of the sources.
+
+Run as a program: all of it, for the tests to find."""
 
 import contextlib
 import fcntl
@@ -12,7 +14,7 @@ from typing import NamedTuple
 CHECKOUT = Path(__file__).resolve().parents[2]
 VERSION = "1.0.0~git20261121.0123456789ab"  # as of a commit between two releases
 EPOCH = 1795219200  # any moment; not that of a checkout or a build
-_SHIPPED = ["CMakeLists.txt", "CMakePresets.json", "cmake", "completions", "docs", "man", "packaging", "src",
+_SHIPPED = ["CMakeLists.txt", "CMakePresets.json", "cmake", "completions", "ctl", "docs", "man", "packaging", "src",
             "CHANGELOG.md", "README.md", "SECURITY.md"]
 
 
@@ -27,22 +29,32 @@ class Architecture(NamedTuple):
     triplet: str
     machine: str  # as readelf names it
     libraries: frozenset
-    level: str  # the oldest glibc that the program starts on
-    runner: tuple  # has it run with the C library that it was built with, glibc 2.31
-    packages: tuple
+    levels: dict  # the oldest glibc that each program starts on
+    runner: tuple  # has the installer run with the C library that it was built with, glibc 2.31
+    ctl_runner: tuple  # has orvpatchctl run
+    packages: tuple  # of each program
+
+    @property
+    def all_packages(self):
+        return [name.format(p=program, v="{v}") for program in PROGRAMS for name in self.packages]
 
 
+PROGRAMS = ("orvpatch", "orvpatchctl")
+# What orvpatchctl runs with under emulation: libarchive and its libraries, and a C library that they accept.
+_RUN_SYSROOT = SYSROOTS / "ppc64le-run"
 AMD64 = Architecture(
     "x86_64", "amd64", "x86_64-linux-gnu", "Advanced Micro Devices X86-64",
-    frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), "2.14",
+    frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), {"orvpatch": "2.14", "orvpatchctl": "2.17"},
     (f"{_AMD64_LIBRARIES}/ld-linux-x86-64.so.2", "--library-path", _AMD64_LIBRARIES),
-    ("orvpatch-{v}-linux-x86_64-debug.tar.gz", "orvpatch-{v}-linux-x86_64.tar.gz",
-     "orvpatch_{v}-1_amd64.deb"))
+    (),
+    ("{p}-{v}-linux-x86_64-debug.tar.gz", "{p}-{v}-linux-x86_64.tar.gz", "{p}_{v}-1_amd64.deb"))
 PPC64LE = Architecture(
-    "ppc64le", "ppc64el", "powerpc64le-linux-gnu", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}), "2.17",
+    "ppc64le", "ppc64el", "powerpc64le-linux-gnu", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}),
+    {"orvpatch": "2.17", "orvpatchctl": "2.17"},
     ("qemu-ppc64le", "-L", f"{SYSROOTS}/ppc64le/usr/powerpc64le-linux-gnu"),
-    ("orvpatch-{v}-1.ppc64le.rpm", "orvpatch-{v}-linux-ppc64le-debug.tar.gz", "orvpatch-{v}-linux-ppc64le.tar.gz",
-     "orvpatch_{v}-1_ppc64el.deb"))
+    ("qemu-ppc64le", "-L", str(_RUN_SYSROOT)),
+    ("{p}-{v}-1.ppc64le.rpm", "{p}-{v}-linux-ppc64le-debug.tar.gz", "{p}-{v}-linux-ppc64le.tar.gz",
+     "{p}_{v}-1_ppc64el.deb"))
 ARCHITECTURES = [AMD64, PPC64LE]
 
 
@@ -58,15 +70,18 @@ class Build(NamedTuple):
         return self.folder / "orvpatch"
 
     @property
+    def programs(self):
+        return [self.folder / name for name in PROGRAMS]
+
+    @property
     def packages(self):
         return self.folder / "packages"
 
-    def package(self, suffix):
-        return next(path for path in self.packages.glob(f"*{suffix}") if "-debug." not in path.name)
+    def package(self, suffix, program="orvpatch"):
+        return next(path for path in self.packages.glob(f"{program}[-_]*{suffix}") if "-debug." not in path.name)
 
-    @property
-    def symbols(self):
-        return next(self.packages.glob("*-debug.tar.gz"))
+    def symbols(self, program):
+        return next(self.packages.glob(f"{program}-*-debug.tar.gz"))
 
 
 @functools.cache
@@ -87,9 +102,19 @@ def ship(architecture, folder, umask, **environment):
     return Build(architecture, source / "build" / architecture.preset, done.stdout)
 
 
+def first_build(architecture):
+    return ship(architecture, "a", 0o022, TZ="UTC", LC_ALL="C")
+
+
+def second_build(architecture):
+    """In another folder, under another mask, in another zone and language."""
+    return ship(architecture, "another-folder/with/a-longer-name", 0o027, TZ="Asia/Tokyo", LC_ALL="C.UTF-8")
+
+
 def _sysroots(preset, source):
     """Where the build in `source` finds its libraries."""
-    subprocess.run([CHECKOUT / "packaging/sysroot", preset], check=True, stdout=subprocess.DEVNULL)
+    for folder in [preset, _RUN_SYSROOT.name]:
+        subprocess.run([CHECKOUT / "packaging/sysroot", folder], check=True, stdout=subprocess.DEVNULL)
     if source.name == "a":
         return SYSROOTS
     copies = source / "build/sysroot"
@@ -128,3 +153,9 @@ def _copy_sources(target):
         if not (target / path).exists() or (target / path).read_bytes() != content:
             (target / path).parent.mkdir(parents=True, exist_ok=True)
             shutil.copy(CHECKOUT / path, target / path)
+
+
+if __name__ == "__main__":
+    for found in ARCHITECTURES:
+        first_build(found)
+        second_build(found)

@@ -11,7 +11,7 @@ pytestmark = pytest.mark.packages
 
 
 def checksums(build):
-    files = [build.program, *(path for path in build.packages.iterdir() if path.suffix in (".deb", ".rpm", ".gz"))]
+    files = [*build.programs, *(path for path in build.packages.iterdir() if path.suffix in (".deb", ".rpm", ".gz"))]
     return {path.name: hashlib.sha256(path.read_bytes()).hexdigest() for path in files}
 
 
@@ -22,15 +22,16 @@ def test_two_builds_are_the_same(build, other_build):
 
 def test_every_package_is_made(build):
     made = sorted(path.name for path in build.packages.iterdir() if path.suffix in (".deb", ".rpm", ".gz"))
-    assert made == sorted(name.format(v=VERSION) for name in build.architecture.packages)
+    assert made == sorted(name.format(v=VERSION) for name in build.architecture.all_packages)
 
 
 def test_nothing_warns(build, other_build):
     assert "warning" not in (build.output + other_build.output).lower()
 
 
-def test_program_holds_no_path_of_the_build(build):
-    assert str(build.folder.parents[1]).encode() not in build.program.read_bytes()
+def test_programs_hold_no_path_of_the_build(build):
+    for program in build.programs:
+        assert str(build.folder.parents[1]).encode() not in program.read_bytes()
 
 
 def test_header_of_the_log_has_the_date_of_the_release(build, home):
