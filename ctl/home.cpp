@@ -7,7 +7,6 @@
 #include <tuple>
 #include <utility>
 
-#include <dirent.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -41,21 +40,26 @@ public:
   FailureWatch &operator=(const FailureWatch &) = delete;
   ~FailureWatch() { static_cast<void>(setLogSink(std::move(before_))); }
 
-  /// JudgementError with the first failure.
-  void check() const {
+  /// JudgementError with the first failure, or when nothing was read of a registry that has version files:
+  /// the installer takes a directory that cannot be opened for an empty one.
+  void check(const std::vector<std::string> &versionFiles) const {
     if (!failure_.empty())
       throw JudgementError(failure_);
+    if (!hasReadVersionFile_ && !versionFiles.empty())
+      throw JudgementError("cannot read " + home_ + "registry");
   }
 
 private:
   void look(std::string_view line) {
+    hasReadVersionFile_ = hasReadVersionFile_ || contains(line, "): ORVComponentRegistry::buildComponent(");
     if (!failure_.empty())
       return;
     if (contains(line, "): Could not read "))
       lookAtVersionFile(line);
     else if (contains(line, "): unable to read RunInfo file") && access((home_ + RunInfo).c_str(), F_OK) == 0)
       failure_ = "cannot read " + home_ + RunInfo;
-    else if (contains(line, "): unable to running command") || contains(line, "): Error creating std"))
+    else if (contains(line, "): unable to running command") || contains(line, "): Error creating std") ||
+             contains(line, "): Error calling fork"))
       failure_ = "cannot run ps";
     else if (contains(line, "): Error from readdir: ") ||
              contains(line, "): Unable to determine file/directory for path: "))
@@ -73,19 +77,23 @@ private:
 
   std::string home_;
   std::string failure_;
+  bool hasReadVersionFile_ = false;
   LogSink before_;
 };
 
-struct CloseDirectory {
-  void operator()(DIR *directory) const { closedir(directory); }
-};
-using Directory = std::unique_ptr<DIR, CloseDirectory>;
-
-/// The installer takes a directory that cannot be opened for an empty one.
-void requireDirectory(const std::string &path) {
-  const Directory directory(opendir(path.c_str()));
-  if (directory == nullptr)
-    throw JudgementError("cannot read " + path + ": " + strerror(errno));
+/// The names of the registry's version files, as the installer chooses them.
+std::vector<std::string> versionFilesOf(const std::string &registry) {
+  static constexpr std::string_view end = ".ver";
+  std::vector<std::string> names;
+  const bool exists = listDirectory(registry, [&](const std::string &name) {
+    const bool isNamedSo =
+        name.size() > end.size() && name.compare(name.size() - end.size(), end.size(), end) == 0;
+    if (isNamedSo && !contains(name, "vpw.ver") && isRegularFile(registry + "/" + name))
+      names.push_back(name);
+  });
+  if (!exists)
+    throw JudgementError("cannot read " + registry + ": " + strerror(ENOENT));
+  return names;
 }
 
 /// A `ps` that is missing, or another make of it, would make every instance look stopped.
@@ -124,12 +132,12 @@ Home::Home(const std::string &path) : path_(path) {
 }
 
 std::vector<InstalledComponent> Home::components() const {
-  requireDirectory(at("registry"));
+  const std::vector<std::string> versionFiles = versionFilesOf(at("registry"));
   requirePs();
   std::vector<InstalledComponent> components;
   const FailureWatch watch(path_);
   const ORVComponentRegistry registry;
-  watch.check();
+  watch.check(versionFiles);
   for (const ORVComponent *component : *registry.getInstalledComponents())
     components.push_back(describe(*component));
   std::sort(

@@ -30,10 +30,11 @@ def record_of(home, texts, **changes):
     """A record of an installation that failed; `texts` stand wherever something from outside may stand."""
     steps = [("take", 0.01), ("check", 0.5), ("save", 0.0), ("install", 12.25), ("verify", 0.75), ("start", 2.0)]
     patches = [{"file": f"{text}.tar", "sha256": "0" * 64, "product": text[:40], "target": "vema", "name": text,
-                "levelBefore": "06.10.00.00", "levelAfter": "06.10.01.00", "result": "FAIL"} for text in texts[:3]]
+                "levelBefore": "06.10.00.00", "levelAfter": "06.10.01.00", "result": "FAIL",
+                "versionFile": "registry/ynlpp266.ver"} for text in texts[:3]]
     files = [{"path": f"gone/{text}", "change": "new", "saved": "", "before": None, "after": None} for text in texts]
-    files += [{"path": f"old/{text}", "change": "replaced", "saved": "none", "before": state(), "after": None}
-              for text in texts]
+    files += [{"path": f"old/{text}", "change": "replaced", "saved": str(number), "before": state(), "after": None}
+              for number, text in enumerate(texts) if len(text) < 200]  # names that a file can have
     running = [{"product": "kyn", "name": text, "pid": "1", "user": text} for text in texts[:3]]
     return {
         "id": ID, "action": "apply", "undoes": None, "home": f"{home.path}/", "user": texts[0],
@@ -51,6 +52,15 @@ def record_of(home, texts, **changes):
         **changes}
 
 
+def save(home, folder, record):
+    """Makes the saved files of a record, and the directories that they come from."""
+    (folder / "before").mkdir()
+    for file in record["files"]:
+        if file["change"] == "replaced":
+            (home.path / file["path"]).parent.mkdir(parents=True, exist_ok=True)
+            (folder / "before" / file["saved"]).write_text("old", encoding="utf-8")
+
+
 @pytest.fixture(name="page")
 def page_fixture(ctl, home):
     """page(texts) makes the record, has it undone, and returns the page that it has then."""
@@ -60,6 +70,7 @@ def page_fixture(ctl, home):
         folder.mkdir(parents=True)
         folder.parent.chmod(0o700)
         record = record_of(home, texts, **changes)
+        save(home, folder, record)
         (folder / "record.json").write_text(json.dumps(record), encoding="utf-8")
         assert ctl.run("undo", home).status == 0
         return folder / "record.html"
@@ -164,7 +175,9 @@ def test_a_page_that_cannot_be_written_is_told_in_the_record(ctl, home):
     folder = home.path / "patchlogs/transactions" / ID
     (folder / "record.html/kept").mkdir(parents=True)  # what is there cannot be replaced by a file
     folder.parent.chmod(0o700)
-    (folder / "record.json").write_text(json.dumps(record_of(home, ["one"], messages=[])), encoding="utf-8")
+    record = record_of(home, ["one"], messages=[])
+    save(home, folder, record)
+    (folder / "record.json").write_text(json.dumps(record), encoding="utf-8")
     assert ctl.run("undo", home).status == 0
     record = json.loads((folder / "record.json").read_text(encoding="utf-8"))
     assert record["verdict"] == "undone"
