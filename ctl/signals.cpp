@@ -1,6 +1,9 @@
 #include "signals.h"
 
 #include <array>
+#include <cerrno>
+
+#include <poll.h>
 
 namespace {
 
@@ -34,6 +37,22 @@ InterruptionCatcher::~InterruptionCatcher() {
 
 bool wasInterrupted() {
   return noted != 0;
+}
+
+bool waitForInput(int descriptor) {
+  sigset_t interruptions;
+  sigset_t mask;
+  sigemptyset(&interruptions);
+  for (const int number : Interruptions)
+    sigaddset(&interruptions, number);
+  // Blocked but for the wait itself: one that comes just before it would not end it.
+  sigprocmask(SIG_BLOCK, &interruptions, &mask);
+  pollfd input = {descriptor, POLLIN, 0};
+  int ready = 0;
+  while (!wasInterrupted() && (ready = ppoll(&input, 1, nullptr, &mask)) < 0 && errno == EINTR)
+    continue;
+  sigprocmask(SIG_SETMASK, &mask, nullptr);
+  return ready > 0;
 }
 
 void stopIfInterrupted() {

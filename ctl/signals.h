@@ -20,6 +20,8 @@ struct Interrupted {
 
 /// Whether an interruption has been noted.
 bool wasInterrupted();
+/// Waits until something can be read, or the end is reached; false when an interruption comes before.
+bool waitForInput(int descriptor);
 /// Interrupted when one has been noted.
 void stopIfInterrupted();
 /// From the first change to the last nothing but SIGKILL may end this process; what was noted before is

@@ -9,6 +9,7 @@
 
 #include "commands/command.h"
 #include "commands/commands.h"
+#include "signals.h"
 #include "text.h"
 #include "transaction/applying.h"
 #include "transaction/progress.h"
@@ -34,7 +35,8 @@ bool agrees(const Arguments &arguments, const Record &record) {
   printPlan(record, stderr);
   fputs("Apply? [y/N] ", stderr);
   std::string answer;
-  std::getline(std::cin, answer);
+  if (waitForInput(STDIN_FILENO))
+    std::getline(std::cin, answer);
   return answer == "y" || answer == "yes";
 }
 

@@ -177,7 +177,8 @@ def test_an_interruption_leaves_no_folder_behind(ctl, write, scratch, number):
     for index in range(8000):  # tar is at work when the signal comes
         patch.file(f"data/{index}")
     command = subprocess.Popen(
-        [*ctl.program.argv, "lint", write(patch)], env={"TMPDIR": str(folder)}, stdout=subprocess.PIPE
+        [*ctl.program.argv, "lint", write(patch)], env={"TMPDIR": str(folder)}, stdout=subprocess.PIPE,
+        preexec_fn=lambda: signal.signal(number, signal.SIG_DFL),  # ignored where the tests run in the background
     )
     while not any(folder.iterdir()):
         assert command.poll() is None

@@ -116,6 +116,7 @@ def test_the_question(ctl, ready, write, answer, status):
     archive = write(Patch("yn").file("bin/tool", "new\n"))
     command, ours = pty.fork()
     if command == 0:
+        signal.signal(signal.SIGINT, signal.SIG_DFL)  # ignored where the tests run in the background
         os.execv(ctl.program.argv[0], [*ctl.program.argv, "apply", os.fspath(ready.path), os.fspath(archive)])
     shown = b""
     while b"Apply? [y/N] " not in shown:
