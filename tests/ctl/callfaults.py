@@ -12,6 +12,7 @@ from collections import Counter
 from typing import NamedTuple
 
 from faults.calls import KINDS, kind_of
+from faults.injection import expression_of
 
 SEED = int(os.environ.get("ORVPATCH_SEED") or random.randrange(10**6))
 ALL = os.environ.get("ORVPATCH_FAULTS") == "all"
@@ -27,7 +28,6 @@ _PROCESS = re.compile(r"/proc/\d+")
 _PROCESSES = 3
 # Nothing fails the reading of a pipe whose writers have ended, but a signal.
 _PIPE = re.compile(r"^read\(\d+<pipe:")
-_BURST = 3  # an interruption that never ends is no condition that exists
 
 
 class Fault(NamedTuple):
@@ -44,11 +44,7 @@ class Fault(NamedTuple):
     @property
     def words(self):
         """What strace takes."""
-        when = str(self.ordinal)
-        if self.mode == "on":
-            when += f"..{self.ordinal + _BURST - 1}" if self.error == "EINTR" else "+"
-        outcome = "retval=0" if kind_of(self.call) == "heap" else f"error={self.error}"
-        return ["-e", f"trace={self.call}", "-e", f"inject={self.call}:{outcome}:when={when}"]
+        return ["-e", f"trace={self.call}", "-e", expression_of(*self)]
 
 
 def strace(file, words=()):

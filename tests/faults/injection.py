@@ -9,6 +9,16 @@ from .trace import read_trace
 _BURST = 3
 
 
+def expression_of(call, ordinal, error, mode):
+    """What strace takes to let the call of this name and ordinal fail, "once" or with all that follow ("on")."""
+    when = str(ordinal)
+    if mode == "on":
+        when += f"..{ordinal + _BURST - 1}" if error == "EINTR" else "+"
+    # The end of the heap is told without an error: a failure gives the old end, or another below the new one.
+    outcome = "retval=0" if kind_of(call) == "heap" else f"error={error}"
+    return f"inject={call}:{outcome}:when={when}"
+
+
 class Injection(NamedTuple):
     """One fault: the call of this name and ordinal fails with this error, alone ("once") or with all of its
     name that follow ("on")."""
@@ -29,12 +39,7 @@ class Injection(NamedTuple):
 
     @property
     def expression(self):
-        when = str(self.ordinal)
-        if self.mode == "on":
-            when += f"..{self.ordinal + _BURST - 1}" if self.error == "EINTR" else "+"
-        # The end of the heap is told without an error: a failure gives the old end, or another below the new one.
-        outcome = "retval=0" if kind_of(self.call) == "heap" else f"error={self.error}"
-        return f"inject={self.call}:{outcome}:when={when}"
+        return expression_of(self.call, self.ordinal, self.error, self.mode)
 
     @property
     def spares_the_log(self):
