@@ -145,7 +145,7 @@ orvpatch_units(listing LABELS listing COST 20 UNDER tests/support/relisted $<TAR
 orvpatch_pytest(listing.cases PATHS cases hostile LABELS listing PARTS 4 COST 50
   UNDER tests/support/relisted $<TARGET_FILE:listing>)
 
-# The sanitized build is clang's: it is also the one that holds everything to clang's warnings.
+# The sanitized build is clang's, too: the plain one is for runs without it.
 orvpatch_build(clang LABELS clang)
 orvpatch_build(sanitize LABELS sanitize)
 set(sanitized LABELS sanitize NEEDS sanitize TREE ${builds}/sanitize
