@@ -42,12 +42,19 @@ class Ctl:
     def __init__(self, module):
         self._module = module
         self.home = module.params["home"].rstrip("/") or "/"
-        self.program = self._find(module.params["orvpatchctl"])
+        self.program = module.params["orvpatchctl"]
 
-    def _find(self, name):
-        if "/" in name:
-            return name
-        return self._module.get_bin_path(name, required=True, opt_dirs=["/usr/local/bin", "/usr/local/sbin"])
+    def find(self):
+        """Looks for the program where it is given by its name alone."""
+        if "/" not in self.program:
+            self.program = self._found(self.program)
+        return self
+
+    def _found(self, name):
+        found = self._module.get_bin_path(name, opt_dirs=["/usr/local/bin", "/usr/local/sbin"])
+        if found is None:
+            raise CtlError("%s is neither in PATH nor below /usr/local" % name, 2)
+        return found
 
     def read(self, command, *words, **options):
         """The document of a command that only reads. Other statuses than `accepted` are errors."""

@@ -16,6 +16,7 @@ import hashlib
 import json
 import os
 import select
+import shutil
 import stat
 import subprocess
 import time
@@ -41,6 +42,10 @@ class StateError(Exception):
 
 class Lost(Exception):
     """Nothing waits for the module any more."""
+
+
+class Busy(Exception):
+    """Another module has kept the home to itself for too long."""
 
 
 class Run:
@@ -82,16 +87,7 @@ class Run:
 
     def wait(self, seconds, is_listened):
         """Waits for the end; False when it has not come in time (0: no limit). Lost when nothing listens any more."""
-        limit = time.time() + seconds
-        pause = 0.05
-        while self.is_alive:
-            if not is_listened():
-                raise Lost()
-            if seconds and time.time() > limit:
-                return False
-            time.sleep(pause)
-            pause = min(pause * 1.5, 1.0)
-        return True
+        return await_that(lambda: not self.is_alive, seconds, is_listened)
 
     def _read(self, name):
         try:
@@ -110,12 +106,15 @@ class Runs:
         self._folder = os.path.join(root, key)
 
     @contextmanager
-    def locked(self):
-        """One module at a time looks for a run and starts one."""
+    def locked(self, seconds=0, is_listened=lambda: True):
+        """One module at a time looks for a run and starts one; it waits for its turn as `wait` does."""
         make_private(self._root)
         make_private(self._folder)
-        with open(os.path.join(self._folder, "lock"), "a") as lock:
-            fcntl.flock(lock, fcntl.LOCK_EX)
+        with usable(self._folder):
+            lock = open(os.path.join(self._folder, "lock"), "a")
+        with lock:
+            if not await_that(lambda: is_mine(lock), seconds, is_listened):
+                raise Busy()
             yield
 
     def find(self):
@@ -129,8 +128,8 @@ class Runs:
         """Starts a run of this command line; `job` says what it is for."""
         name = "%s-%d" % (datetime.datetime.utcnow().strftime("%Y%m%dT%H%M%S.%fZ"), os.getpid())
         folder = os.path.join(self._folder, name)
-        os.mkdir(folder, 0o700)
-        _write(os.path.join(folder, "run.json"), json.dumps(dict(job, line=line)))
+        with usable(folder):
+            self._make(folder, json.dumps(dict(job, line=line)))
         with open(os.devnull, "r+b") as null:
             process = subprocess.Popen(
                 ["/bin/sh", "-c", SUPERVISOR, "sh", folder] + line,
@@ -148,6 +147,16 @@ class Runs:
         self._remove_old()
         return run
 
+    @staticmethod
+    def _make(folder, job):
+        """The whole folder or none: one without its job would be found as a run."""
+        os.mkdir(folder, 0o700)
+        try:
+            _write(os.path.join(folder, "run.json"), job)
+        except OSError:
+            shutil.rmtree(folder, ignore_errors=True)
+            raise
+
     def _all(self):
         try:
             names = sorted(os.listdir(self._folder))
@@ -161,6 +170,40 @@ class Runs:
                 for name in os.listdir(run.folder):
                     os.unlink(os.path.join(run.folder, name))
                 os.rmdir(run.folder)
+
+
+def await_that(holds, seconds, is_listened):
+    """Whether it comes to hold in time (0: no limit). Lost when nothing listens any more."""
+    limit = time.time() + seconds
+    pause = 0.05
+    while not holds():
+        if not is_listened():
+            raise Lost()
+        if seconds and time.time() > limit:
+            return False
+        time.sleep(pause)
+        pause = min(pause * 1.5, 1.0)
+    return True
+
+
+def is_mine(lock):
+    """Takes a lock when it is free."""
+    try:
+        fcntl.flock(lock, fcntl.LOCK_EX | fcntl.LOCK_NB)
+    except OSError as error:
+        if error.errno not in (errno.EAGAIN, errno.EACCES, errno.EINTR):
+            raise StateError("cannot lock %s: %s" % (lock.name, error.strerror))
+        return False
+    return True
+
+
+@contextmanager
+def usable(folder):
+    """What cannot be written for a run that has not begun is told as such."""
+    try:
+        yield
+    except OSError as error:
+        raise StateError("cannot use %s: %s" % (folder, error.strerror))
 
 
 def supervises(pid, folder):

@@ -22,11 +22,14 @@ class Transacting:
     def execute(self, work):
         """Calls `work`, and tells the engine what stops it."""
         try:
+            self.program.find()
             work()
-        except (ctl.CtlError, runs.StateError) as error:
-            self.fail(str(error))
+        except (ctl.CtlError, runs.StateError) as error:  # each arises before a run is started
+            self.fail(str(error), "refused", resumed=False)
+        except runs.Busy:
+            self._fail_by_time("another module keeps the home to itself; nothing was begun", resumed=False)
         except runs.Lost:
-            self.module.exit_json(changed=True, msg="the connection was lost; the run goes on")
+            self.module.exit_json(changed=True, msg="the connection was lost; a run that was started goes on")
 
     def earlier(self, job):
         """The ended run of the same job that no module has told yet, or that this one has waited for; None when there
@@ -45,7 +48,7 @@ class Transacting:
         """Waits for the runs at work on the home. Inside, no other module starts one, nor checks: a check while another
         controller's installation begins would refuse the home, or make that one refuse it."""
         while True:
-            with self.runs.locked():
+            with self.runs.locked(self.module.params["timeout"], runs.is_listened):
                 run = self.runs.find()
                 if run is None or not run.is_alive:
                     yield
@@ -54,16 +57,18 @@ class Transacting:
             self.waited_for = run
 
     def start(self, job, words):
-        """Starts the job; `wait` waits for its end."""
+        """Starts the job; `wait` waits for its end. What no controller would hear of is not begun."""
+        if not runs.is_listened():
+            raise runs.Lost()
         return self.runs.start(job, [self.program.program] + words + ["--json"])
 
     def wait(self, run):
         if not run.wait(self.module.params["timeout"], runs.is_listened):
-            self.fail(
-                "not ended after %d seconds: it goes on, and this task will find it"
-                % self.module.params["timeout"],
-                verdict="running",
-            )
+            self._fail_by_time("it goes on, and this task will find it", resumed=run.process is None)
+
+    def _fail_by_time(self, text, resumed):
+        message = "not ended after %d seconds: %s" % (self.module.params["timeout"], text)
+        self.fail(message, "running", resumed=resumed)
 
     def record(self, run):
         """The record of an ended run, None when it has none."""
@@ -78,6 +83,16 @@ class Transacting:
     def fail(self, message, verdict="failed", record=None, **more):
         more.update(levels_of(record))
         self.module.fail_json(msg=message, verdict=verdict, record=self.brief(record), **more)
+
+    def fail_as(self, record, run, resumed):
+        """Tells an ended run that did not end well."""
+        verdict = record["verdict"] if record else self._verdict_without_record()
+        self.fail(reason(record, run.err), verdict, record, resumed=resumed)
+
+    def _verdict_without_record(self):
+        """Nothing was changed, unless a transaction was left open."""
+        kept = transactions.records(self.program.home)
+        return "refused" if all(transactions.has_ended(one) for one in kept) else "failed"
 
     def succeed(self, changed, verdict, record, **more):
         for key, value in levels_of(record).items():

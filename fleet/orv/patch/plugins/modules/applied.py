@@ -152,13 +152,9 @@ check:
       type: dict
 """
 
-import errno
-import hashlib
-import os
-
 from ansible.module_utils.basic import AnsibleModule
 
-from ansible_collections.orv.patch.plugins.module_utils import ctl, transacting, transactions
+from ansible_collections.orv.patch.plugins.module_utils import ctl, patches, transacting, transactions
 
 # Verdicts after which the home may be another one than before; a refusal is not worth telling twice.
 ENDED_BADLY = ("failed", "incomplete", "undone")
@@ -176,8 +172,7 @@ class Applying:
     def work(self):
         shown = self.program.show(self.patch)
         self._demand_digests([one["file"] for one in shown])
-        found = dict((one["file"], sha256(self._path_of(one["file"]))) for one in shown)
-        job = {"action": "apply", "digests": found}
+        job = {"action": "apply", "digests": patches.digests(self.patch, shown)}
         with self.transacting.alone():
             run = self._begin(job, shown)
         self.transacting.wait(run)
@@ -197,20 +192,19 @@ class Applying:
             job, ["apply", self.program.home, self.patch, "--yes"] + self._options()
         )
 
-    def _demand_digests(self, patches):
+    def _demand_digests(self, present):
         wanted = self.module.params["digests"]
         if wanted is None:
             return
-        names = set(wanted) | set(patches)
-        differing = sorted(name for name in names if sha256(self._path_of(name)) != wanted.get(name))
+        differing = sorted(
+            name
+            for name in set(wanted) | set(present)
+            if patches.sha256(patches.path_of(self.patch, name)) != wanted.get(name)
+        )
         if differing:
             self.transacting.fail(
                 "not what it should be: %s" % ", ".join(differing), "refused", resumed=False
             )
-
-    def _path_of(self, name):
-        folder = self.patch if os.path.isdir(self.patch) else os.path.dirname(self.patch)
-        return os.path.join(folder, name)
 
     def _unchanged(self, run, status, found):
         """Nothing is left to do. A run that was cut off has done it: that is a change of this playbook."""
@@ -252,13 +246,7 @@ class Applying:
         if run.status is None:
             text = "the run was killed: the same task takes it back and starts anew"
             self.transacting.fail(text, resumed=resumed)
-        verdict = record["verdict"] if record else self._verdict_without_record()
-        self.transacting.fail(transacting.reason(record, run.err), verdict, record, resumed=resumed)
-
-    def _verdict_without_record(self):
-        """Nothing was changed, unless a transaction was left open."""
-        kept = transactions.records(self.program.home)
-        return "refused" if all(transactions.has_ended(one) for one in kept) else "failed"
+        self.transacting.fail_as(record, run, resumed)
 
     def _options(self):
         params = self.module.params
@@ -287,20 +275,6 @@ class Applying:
             self.transacting.fail(text, "refused", check=check, resumed=False)
         plan = self.program.plan(self.patch, options) if self.module._diff else None
         self.transacting.succeed(True, "checked", plan, check=check, resumed=False)
-
-
-def sha256(path):
-    """The digest of a file; empty when there is none."""
-    digest = hashlib.sha256()
-    try:
-        with open(path, "rb") as stream:
-            for block in iter(lambda: stream.read(1 << 20), b""):
-                digest.update(block)
-    except (IOError, OSError) as error:
-        if error.errno == errno.ENOENT:
-            return ""
-        raise ctl.CtlError("cannot read %s: %s" % (path, error.strerror), 2)
-    return digest.hexdigest()
 
 
 def main():

@@ -146,7 +146,7 @@ def main():
         argument_spec=dict(ctl.arguments(), patch={"type": "path"}), supports_check_mode=True
     )
     try:
-        found = facts(ctl.Ctl(module), module.params["patch"])
+        found = facts(ctl.Ctl(module).find(), module.params["patch"])
     except ctl.CtlError as error:
         module.fail_json(msg=str(error))
     module.exit_json(changed=False, **found)

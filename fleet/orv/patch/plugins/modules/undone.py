@@ -24,7 +24,14 @@ options:
   digests:
     description:
       - File names of patches with their SHA-256. A last transaction that applied anything else is left alone.
+      - Not together with I(patch).
     type: dict
+  patch:
+    description:
+      - A patch file, or a directory of patches, on the host. A last transaction that applied anything else is left
+        alone.
+      - Not together with I(digests).
+    type: path
 extends_documentation_fragment:
   - orv.patch.home
   - orv.patch.home.run
@@ -55,6 +62,7 @@ verdict:
   description:
     - C(undone), or C(unchanged) when there is nothing to take back.
     - C(incomplete) when something stood in the way, which I(record.messages) names. C(refused) is before any change.
+    - C(failed) when the undo broke off. C(running) when I(timeout) was over.
   returned: always
   type: str
 resumed:
@@ -84,7 +92,7 @@ record:
 
 from ansible.module_utils.basic import AnsibleModule
 
-from ansible_collections.orv.patch.plugins.module_utils import ctl, transacting, transactions
+from ansible_collections.orv.patch.plugins.module_utils import ctl, patches, transacting, transactions
 
 
 class Undoing:
@@ -94,12 +102,21 @@ class Undoing:
         self.module = module
         self.transacting = transacting.Transacting(module)
         self.home = self.transacting.program.home
+        self.wanted = None
 
     def work(self):
+        self.wanted = self._wanted()
         with self.transacting.alone():
             run, target = self._begin()
         self.transacting.wait(run)
         self._tell(run, target, False)
+
+    def _wanted(self):
+        """The digests of the patches that may be taken back; None when they may be any."""
+        patch = self.module.params["patch"]
+        if patch is None or self.module.params["transaction"]:
+            return self.module.params["digests"]
+        return patches.digests(patch, self.transacting.program.show(patch))
 
     def _begin(self):
         """Starts the undo of a transaction, unless there is nothing to do, or an earlier one has something to tell."""
@@ -119,22 +136,22 @@ class Undoing:
         if run is None:
             return
         targets = [one for one in transactions.records(self.home) if one["id"] == run.job.get("transaction")]
-        named = self.module.params["transaction"]
-        if targets and named in (None, targets[0]["id"]) and not self.module.check_mode:
+        if targets and self._fits(targets[0]) and not self.module.check_mode:
             self._tell(run, targets[0], True)
 
     def _choose(self, applied):
         named = self.module.params["transaction"]
+        fitting = [one for one in (applied if named else applied[-1:]) if self._fits(one)]
+        if named and not fitting:
+            self.transacting.fail("no transaction %s" % named, "refused", resumed=False)
+        return fitting[0] if fitting else None
+
+    def _fits(self, record):
+        """Whether this may be taken back: the named transaction, or one that applied nothing but what is wanted."""
+        named = self.module.params["transaction"]
         if named:
-            fitting = [one for one in applied if one["id"] == named]
-            if not fitting:
-                self.transacting.fail("no transaction %s" % named, "refused", resumed=False)
-            return fitting[0]
-        last = applied[-1] if applied else None
-        wanted = self.module.params["digests"]
-        if last is not None and wanted is not None:
-            return last if set(transactions.digests(last).items()) <= set(wanted.items()) else None
-        return last
+            return record["id"] == named
+        return self.wanted is None or set(transactions.digests(record).items()) <= set(self.wanted.items())
 
     def _tell(self, run, target, resumed):
         record = self.transacting.record(run)
@@ -143,8 +160,7 @@ class Undoing:
             self._succeed(True, "undone", record, target, resumed)
         if run.status is None:
             self.transacting.fail("the undo was killed: the same task goes on with it", resumed=resumed)
-        verdict = record["verdict"] if record else "refused"
-        self.transacting.fail(transacting.reason(record, run.err), verdict, record, resumed=resumed)
+        self.transacting.fail_as(record, run, resumed)
 
     def _succeed(self, changed, verdict, record, target, resumed=False):
         levels = transacting.levels_of(target)
@@ -162,7 +178,13 @@ class Undoing:
 
 def main():
     module = AnsibleModule(
-        argument_spec=dict(ctl.run_arguments(), transaction={"type": "str"}, digests={"type": "dict"}),
+        argument_spec=dict(
+            ctl.run_arguments(),
+            transaction={"type": "str"},
+            digests={"type": "dict"},
+            patch={"type": "path"},
+        ),
+        mutually_exclusive=[("digests", "patch")],
         supports_check_mode=True,
     )
     undoing = Undoing(module)
