@@ -3,6 +3,7 @@
 import json
 import os
 import re
+import shutil
 import subprocess
 
 import pytest
@@ -20,7 +21,8 @@ PLAY = """\
 
 @pytest.fixture
 def play(controller, home, patch_dir, ctl_binary):
-    """play(word...) runs the role on a home with one product; returns status, output, and how many tasks changed."""
+    """play(word...) runs the role on a home with one product; returns status, output, and how many tasks changed.
+    A variable that is None is left out."""
     home.component("yn")
     (home.path / "tmp").chmod(0o700)
     Patch("yn").file("lib/new", "new\n").write(patch_dir)
@@ -30,12 +32,16 @@ def play(controller, home, patch_dir, ctl_binary):
         "fixpack_source": str(patch_dir),
         "fixpack_orvpatchctl": str(ctl_binary),
     }
-    (controller.folder / "play.yml").write_text(PLAY)
+    (
+        controller.folder / "plays"
+    ).mkdir()  # not where the engine is started: it searches beside a playbook, too
+    (controller.folder / "plays/play.yml").write_text(PLAY)
 
-    def run(*words, **other):
-        hosts = {"all": {"hosts": {"here": {**variables, **other}}}}
+    def run(*words, playbook="plays/play.yml", **other):
+        given = {name: value for name, value in {**variables, **other}.items() if value is not None}
+        hosts = {"all": {"hosts": {"here": given}}}
         (controller.folder / "hosts.json").write_text(json.dumps(hosts))
-        status, printed = controller.run("ansible-playbook", "-i", "hosts.json", "play.yml", *words)
+        status, printed = controller.run("ansible-playbook", "-i", "hosts.json", playbook, *words)
         return status, printed, int(re.search(r"changed=(\d+)", printed).group(1))
 
     return run
@@ -77,9 +83,50 @@ def test_a_patch_that_its_checksums_do_not_list_so_does_not_leave_the_controller
     assert not (controller.folder / "home/.orv_patch").exists()
 
 
-def test_a_role_without_a_home_is_told_what_is_missing(play):
+def test_a_variable_of_another_type_is_told(play):
     status, printed, _ = play(fixpack_keep="many")
     assert status == 2 and "fixpack_keep" in printed
+
+
+def test_a_role_without_a_home_is_told_what_is_missing(play, home):
+    status, printed, _ = play(fixpack_home=None)
+    assert status == 2 and "missing required arguments: fixpack_home" in printed
+    assert home.history() == []
+
+
+def test_a_source_is_looked_for_where_the_engine_was_started(play, home, patch_dir, controller):
+    shutil.copytree(patch_dir, controller.folder / "fixpack2")
+    assert play(fixpack_source="fixpack2")[0] == 0
+    assert home.read("lib/new") == b"new\n"
+    assert play(fixpack_source=f"fixpack2/{Patch('yn').filename}")[::2] == (0, 0)
+
+
+@pytest.mark.parametrize("copy", [True, False])
+def test_only_a_last_transaction_of_the_same_patches_is_undone(play, home, scratch, copy):
+    """Copied or read on the host, another fix pack is not taken back in the place of the one that is meant."""
+    assert play(fixpack_copy=copy)[0] == 0
+    other = scratch / "other"
+    other.mkdir()
+    Patch("yn", level="06100200", fixpack="fp0002").file("lib/other").write(other)
+    undo = {"playbook": "orv.patch.undo", "fixpack_copy": copy}
+    assert play(fixpack_source=str(other), **undo)[::2] == (0, 0)
+    assert home.level("yn") == "06100100"
+    assert play(**undo)[::2] == (0, 1)
+    assert home.level("yn") == "06100000"
+
+
+def test_a_home_that_this_rollout_has_not_changed_is_not_taken_back(play, home, scratch):
+    """Its batch is, but its transaction is an older one: what differs in it came from elsewhere."""
+    assert play()[0] == 0
+    home.write("lib/new", "other\n")
+    before = home.tree()
+    rollout = {"playbook": "orv.patch.rollout", "fixpack_undo_batch": True}
+    status, printed, changed = play(fixpack_report=str(scratch / "reports"), **rollout)
+    assert (status, changed) == (2, 0), printed
+    (told,) = json.loads((scratch / "reports/fleet.json").read_text())["fleet"]
+    assert (told["verdict"], told["batch"]) == ("incomplete", 1)
+    assert told["reason"].startswith("lib/new: ")
+    assert home.tree() == before
 
 
 @pytest.fixture
