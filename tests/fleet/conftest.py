@@ -1,12 +1,14 @@
 """What the tests of the fleet work with: a controller, and hosts with a real sshd each."""
 
 import datetime
+import importlib
 import os
+import sys
 import zlib
 
 import pytest
 
-from controller import Controller
+from controller import COLLECTION, Controller
 from network import Network, why_not
 from support import remove_tree, scratch_folder
 
@@ -39,6 +41,20 @@ def pytest_sessionfinish(session, exitstatus):
         session.exitstatus = pytest.ExitCode.OK
 
 
+@pytest.fixture(scope="module")
+def part():
+    """part("filter.fleet") is that plugin, found as the engine finds it."""
+    folder = scratch_folder()
+    (folder / "ansible_collections/orv").mkdir(parents=True)
+    (folder / "ansible_collections/orv/patch").symlink_to(COLLECTION)
+    sys.path.insert(0, str(folder))
+    sys.dont_write_bytecode, kept = True, sys.dont_write_bytecode
+    yield lambda name: importlib.import_module(f"ansible_collections.orv.patch.plugins.{name}")
+    sys.dont_write_bytecode = kept
+    sys.path.remove(str(folder))
+    remove_tree(folder)
+
+
 @pytest.fixture
 def controller():
     """A controller of this machine alone."""
@@ -61,6 +77,8 @@ def network(program, ctl_binary):
     if reason:
         pytest.skip(reason)
     made = Network([program.binary, ctl_binary])
-    made.controller = Controller.of(made, "c")
-    yield made
-    made.close()
+    try:
+        made.controller = Controller.of(made, "c")
+        yield made
+    finally:
+        made.close()

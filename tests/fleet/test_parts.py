@@ -2,29 +2,12 @@
 
 import ast
 import hashlib
-import importlib
 import os
-import sys
 import time
 
 import pytest
 
 from modules import COLLECTION
-from support import remove_tree, scratch_folder
-
-
-@pytest.fixture(scope="module")
-def part():
-    """part("filter.fleet") is that plugin, found as the engine finds it."""
-    folder = scratch_folder()
-    (folder / "ansible_collections/orv").mkdir(parents=True)
-    (folder / "ansible_collections/orv/patch").symlink_to(COLLECTION)
-    sys.path.insert(0, str(folder))
-    sys.dont_write_bytecode, kept = True, sys.dont_write_bytecode
-    yield lambda name: importlib.import_module(f"ansible_collections.orv.patch.plugins.{name}")
-    sys.dont_write_bytecode = kept
-    sys.path.remove(str(folder))
-    remove_tree(folder)
 
 
 @pytest.mark.parametrize(
@@ -32,7 +15,7 @@ def part():
     sorted(COLLECTION.glob("plugins/module*/*.py")),
     ids=lambda path: f"{path.parent.name}/{path.stem}",
 )
-def test_hosts_with_python_3_6_take_it(path):
+def test_the_grammar_is_that_of_python_3_6(path):
     ast.parse(path.read_text(encoding="utf-8"), feature_version=(3, 6))
 
 
@@ -42,6 +25,7 @@ FACTS = {"home": "/opt/orv", "components": [{"code": "kyn"}], "levels": {"kyn": 
 AFTER = dict(FACTS, levels={"kyn": "06.10.01.00"})
 RECORD = {"id": "T1", "started": "2026-03-09T17:04:12Z", "ended": "2026-03-09T17:04:55Z"}
 APPLIED = {"verdict": "applied", "transaction": "T1", "record": RECORD}
+FAILED = {"failed": True, "verdict": "failed", "msg": "no space", "transaction": "T1", "record": RECORD}
 BATCH = {"number": "2", "started": "2026-03-09T17:00:00Z"}
 END = {"ended": "2026-03-09T17:10:00Z", "bad": False}
 
@@ -87,7 +71,11 @@ def test_a_host_that_was_unchanged_has_the_times_of_its_batch(part):
 @pytest.mark.parametrize(
     "registered, verdict, reason",
     [
-        ({"facts": {"failed": True, "msg": "no home"}}, "failed", "no home"),
+        ({"facts": {"failed": True, "msg": "no home"}}, "refused", "no home"),
+        ({"made": {"failed": True, "msg": "no space"}}, "refused", "no space"),
+        ({"check": {"failed": True, "msg": "crashed"}}, "refused", "crashed"),
+        ({"result": {"failed": True, "msg": "crashed"}}, "failed", "crashed"),
+        ({"result": APPLIED, "verified": {"failed": True, "msg": "crashed"}}, "incomplete", "crashed"),
         ({"facts": {"unreachable": True, "msg": "no route"}}, "unreachable", "no route"),
         (
             {
@@ -97,13 +85,31 @@ def test_a_host_that_was_unchanged_has_the_times_of_its_batch(part):
                     "results": [{"failed": True, "msg": "no space"}, {}],
                 }
             },
-            "failed",
+            "refused",
             "no space",
         ),
         ({"check": {"failed": True, "verdict": "refused", "msg": "backlevel"}}, "refused", "backlevel"),
         ({"check": {"verdict": "checked"}}, "checked", ""),
         ({"result": {"failed": True, "verdict": "incomplete", "msg": "lib/a"}}, "incomplete", "lib/a"),
         ({"result": APPLIED, "verified": {"unreachable": True, "msg": "cut"}}, "unreachable", "cut"),
+        ({"result": FAILED, "verified": {"unreachable": True, "msg": "cut"}}, "failed", "no space"),
+        ({"result": FAILED, "verified": {"failed": True, "msg": "crashed"}}, "failed", "no space"),
+        ({"result": FAILED, "verified": {"verdict": "checked"}}, "failed", "no space"),
+        (
+            {"check": {"failed": True, "verdict": "refused", "msg": "in use"}, "result": APPLIED},
+            "applied",
+            "",
+        ),
+        (
+            {"result": FAILED, "undone": {"failed": True, "verdict": "refused", "msg": "in use"}},
+            "incomplete",
+            "no space; not taken back: in use",
+        ),
+        (
+            {"result": FAILED, "undone": {"unreachable": True, "msg": "cut"}},
+            "unreachable",
+            "no space; not taken back: cut",
+        ),
         ({"check": {"skipped": True, "verdict": "checked"}}, "untouched", ""),
         ({"result": APPLIED, "undone": {"verdict": "unchanged"}}, "applied", ""),
         ({"result": APPLIED, "undone": {"failed": True, "msg": "no"}}, "incomplete", "not taken back: no"),
@@ -114,7 +120,7 @@ def test_a_host_that_was_unchanged_has_the_times_of_its_batch(part):
         ),
     ],
 )
-def test_the_last_task_decides(part, registered, verdict, reason):
+def test_the_last_task_that_decides_is_told(part, registered, verdict, reason):
     made = entry_of(part, **registered)
     assert (made["verdict"], made["reason"]) == (verdict, reason)
 
@@ -127,6 +133,11 @@ def test_a_home_that_differs_from_its_patch_is_incomplete(part):
     assert made["reason"].startswith("lib/0: missing; ") and made["reason"].endswith("; and 2 more")
     failed = {"failed": True, "verdict": "failed", "msg": "no space"}
     assert entry_of(part, result=failed, verified=verified)["reason"] == "no space"
+
+
+def test_a_home_that_failed_and_was_read_again_has_its_levels(part):
+    made = entry_of(part, facts=FACTS, result=FAILED, verified=AFTER)
+    assert (made["verdict"], made["levelsAfter"]) == ("failed", AFTER["levels"])
 
 
 def test_a_host_that_was_taken_back_keeps_reason_and_record(part):
@@ -167,6 +178,7 @@ def test_what_no_batch_has_reached_is_untouched_in_a_rollout(part):
         made = part("filter.fleet").document(entries, ["a.tar"], "then", "now", rollout)
         assert [one["verdict"] for one in made["fleet"]] == verdicts
         assert (made["patches"], made["started"], made["ended"]) == (["a.tar"], "then", "now")
+        assert made["rollout"] is rollout
 
 
 # --- what goes to the hosts ---

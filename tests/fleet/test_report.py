@@ -17,7 +17,7 @@ import pytest
 COLLECTION = Path(__file__).resolve().parents[2] / "fleet/orv/patch"
 sys.path.insert(0, str(COLLECTION / "plugins"))
 
-from module_utils.report import as_csv, as_json, summary_of  # noqa: E402
+from module_utils.report import MEANINGS, as_csv, as_json, summary_of  # noqa: E402
 from module_utils.report_page import as_page  # noqa: E402
 
 HOSTILE = [
@@ -326,6 +326,8 @@ def test_what_a_host_makes_up_spoils_no_report(value):
         ("checked checked", "checked"),
         ("checked unchanged", "checked"),
         ("undone undone", "undone"),
+        ("undone unchanged", "undone"),
+        ("refused running", "stopped"),
         ("checked refused", "refused"),
         ("untouched refused unreachable", "refused"),
         ("applied refused", "stopped"),
@@ -341,6 +343,39 @@ def test_what_a_host_makes_up_spoils_no_report(value):
 def test_verdict_of_the_whole(found, verdict):
     fleet = [entry(f"host{place}", word) for place, word in enumerate(found.split())]
     assert summary_of(document(*fleet))["verdict"] == verdict
+
+
+@pytest.mark.parametrize(
+    "found, verdict",
+    [
+        ("undone undone", "stopped"),
+        ("undone unchanged", "stopped"),
+        ("unchanged unchanged", "unchanged"),
+        ("", "empty"),
+    ],
+)
+def test_a_rollout_that_was_taken_back_is_no_good_end(shows, browser, found, verdict):
+    fleet = [entry(f"host{place}", word) for place, word in enumerate(found.split())]
+    content = document(*fleet, rollout=True)
+    assert json.loads(as_json(content))["rollout"] is True
+    shows(content)
+    assert browser.texts("h1") == [verdict]
+    assert browser.run("document.querySelector('header').className") == (
+        "good" if verdict == "unchanged" else "bad"
+    )
+
+
+def test_an_undo_that_finds_some_homes_without_the_patches_is_a_good_end(shows, browser):
+    shows(document(entry("one", "undone"), entry("two", "unchanged")))
+    assert browser.texts("h1") == ["undone"]
+    assert browser.run("document.querySelector('header').className") == "good"
+
+
+def test_what_was_only_read_is_not_told_to_have_patches(shows, browser):
+    """Check, undo and report leave a home unchanged, too."""
+    shows(document(entry("one", "unchanged", 0), patches=[]))
+    assert browser.texts("header p")[0] == "Nothing was changed on any home."
+    assert "patches" not in MEANINGS["unchanged"]
 
 
 def test_the_batches_of_the_summary():
@@ -450,6 +485,33 @@ def test_the_module_writes_what_is_new(write, tmp_path):
     assert not write(a_stopped_rollout())["changed"]
     assert write(document(entry("other")), formats=["csv"])["paths"] == {"csv": str(folder / "fleet.csv")}
     assert json.loads((folder / "fleet.json").read_text())["summary"]["verdict"] == "stopped"
+
+
+def test_others_can_read_the_report_at_no_moment(part, tmp_path, monkeypatch):
+    """Whatever the umask: what is renamed is private already, and lies in the same directory."""
+    path, seen = tmp_path / "fleet.html", []
+    rename = os.rename
+    path.write_text("before\n")
+    path.chmod(0o644)
+
+    def watch(source, target):
+        seen.append((os.path.dirname(source), stat.S_IMODE(os.stat(source).st_mode), target))
+        rename(source, target)
+
+    monkeypatch.setattr(os, "rename", watch)
+    kept = os.umask(0)
+    try:
+        part("modules.report").replace(str(path), b"new")
+    finally:
+        os.umask(kept)
+    assert seen == [(str(tmp_path), 0o600, str(path))]
+    assert (path.read_bytes(), stat.S_IMODE(path.stat().st_mode)) == (b"new", 0o600)
+
+
+def test_a_report_that_cannot_be_written_leaves_nothing(write, tmp_path):
+    (tmp_path / "a/b/fleet.html").mkdir(parents=True)
+    assert "the report cannot be written" in write(a_stopped_rollout(), status=2)["msg"]
+    assert [path.name for path in (tmp_path / "a/b").iterdir()] == ["fleet.html"]
 
 
 @pytest.mark.parametrize("name", ["../x", "", "..", "a/b"])

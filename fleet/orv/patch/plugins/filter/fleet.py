@@ -5,7 +5,16 @@ from __future__ import absolute_import, division, print_function
 __metaclass__ = type
 
 GOOD = ("applied", "unchanged", "checked", "untouched")
-STEPS = ("facts", "made", "staged", "check", "result", "verified")
+# The steps in their order, each with what the home is when the step fails and gives no verdict: what comes before the
+# transaction has changed nothing, and what comes behind it leaves open whether the home is as it should be.
+STEPS = (
+    ("facts", "refused"),
+    ("made", "refused"),
+    ("staged", "refused"),
+    ("check", "refused"),
+    ("result", "failed"),
+    ("verified", "incomplete"),
+)
 
 
 def entry(variables):
@@ -22,23 +31,18 @@ def entry(variables):
         "transaction": None,
         "record": None,
     }
-    for step in STEPS:
-        add(made, variables.get("fixpack_" + step) or {})
+    for step, untold in STEPS:
+        add(made, variables.get("fixpack_" + step) or {}, untold, step != "verified" or not is_bad(made))
     take_back(made, variables.get("fixpack_undone") or {})
     return timed(made, variables.get("fixpack_batch") or {}, variables.get("fixpack_batch_end") or {})
 
 
-def add(made, result):
-    """What one more task has told."""
+def add(made, result, untold, decides):
+    """What one more task has told. One that does not decide adds its facts: the verdict and its reason stay."""
     if result.get("skipped"):
         return
-    if result.get("unreachable"):
-        made.update(verdict="unreachable", reason=result.get("msg", ""))
-        return
-    if result.get("failed"):
-        made.update(verdict=result.get("verdict", "failed"), reason=reason(result))
-    elif result.get("verdict"):
-        made.update(verdict=result["verdict"], reason="")
+    if decides:
+        judge(made, result, untold)
     if "components" in result:
         made.update(home=result["home"], components=result["components"], levelsAfter=result["levels"])
         made["levelsBefore"] = made["levelsBefore"] or result["levels"]
@@ -48,6 +52,16 @@ def add(made, result):
         hold_against(made, result["verification"])
     for key in ("transaction", "record"):
         made[key] = result.get(key) or made[key]
+
+
+def judge(made, result, untold):
+    """The verdict of a task, and its reason."""
+    if result.get("unreachable"):
+        made.update(verdict="unreachable", reason=result.get("msg", ""))
+    elif result.get("failed"):
+        made.update(verdict=result.get("verdict", untold), reason=reason(result))
+    elif result.get("verdict"):
+        made.update(verdict=result["verdict"], reason="")
 
 
 def hold_against(made, verification):
@@ -64,10 +78,12 @@ def take_back(made, result):
     """What the undo has told; why it was, and the record of what was taken back, stay."""
     if not result or result.get("skipped") or result.get("verdict") == "unchanged":
         return
-    if result.get("unreachable"):
-        made.update(verdict="unreachable", reason="not taken back: %s" % result.get("msg", ""))
-    elif result.get("failed"):
-        made.update(verdict="incomplete", reason="not taken back: %s" % result.get("msg", ""))
+    if result.get("unreachable") or result.get("failed"):
+        said = [made["reason"], "not taken back: %s" % result.get("msg", "")]
+        made.update(
+            verdict="unreachable" if result.get("unreachable") else "incomplete",
+            reason="; ".join(one for one in said if one),
+        )
     else:
         made.update(
             verdict="undone",
@@ -102,7 +118,13 @@ def is_bad(made, undoing=False):
 def document(entries, patches, started, ended, rollout):
     """The document of all entries."""
     shown = [dict(made, **last_word(made, rollout)) for made in entries]
-    return {"fleet": shown, "patches": patches, "started": started, "ended": ended}
+    return {
+        "fleet": shown,
+        "patches": patches,
+        "started": started,
+        "ended": ended,
+        "rollout": bool(rollout),
+    }
 
 
 def last_word(made, rollout):

@@ -18,7 +18,7 @@ VERDICTS = [
     (
         "incomplete",
         "bad",
-        "The installer ended well, but the home is not as the patches want it, or the run was cut off.",
+        "The home is not as the patches want it, could not be compared with them, or was not taken back whole.",
     ),
     ("refused", "bad", "Refused before anything was changed."),
     (
@@ -31,7 +31,7 @@ VERDICTS = [
     ("untouched", "soft", "Its turn did not come; nothing was changed."),
     ("checked", "good", "The check found nothing that stands in the way; nothing was changed."),
     ("applied", "good", "The patches are installed, and every file was verified."),
-    ("unchanged", "good", "The patches were installed before; nothing was changed."),
+    ("unchanged", "good", "There was nothing to do; nothing was changed."),
 ]
 KINDS = {name: kind for name, kind, _meaning in VERDICTS}
 MEANINGS = {name: meaning for name, _kind, meaning in VERDICTS}
@@ -40,8 +40,8 @@ _ORDER = {verdict[0]: place for place, verdict in enumerate(VERDICTS)}
 # The verdict of the whole run, when no home has another one than these.
 _WHOLE = [
     ("empty", set()),
-    ("undone", {"undone"}),
     ("unchanged", {"unchanged"}),
+    ("undone", {"undone", "unchanged"}),  # but in a rollout, of which it is no good end
     ("applied", {"applied", "unchanged"}),
     ("checked", {"checked", "unchanged"}),
 ]
@@ -153,7 +153,7 @@ def summary_of(document):
     """What the whole run came to: a verdict, the number of homes by verdict, the batches in order."""
     fleet = in_order(document.get("fleet") or [])
     return {
-        "verdict": _verdict_of(fleet),
+        "verdict": _verdict_of(fleet, document.get("rollout")),
         "homes": len(fleet),
         "hosts": len({entry["host"] for entry in fleet}),
         "counts": counts_of(fleet),
@@ -173,12 +173,12 @@ def counts_of(fleet):
     return counts
 
 
-def _verdict_of(fleet):
+def _verdict_of(fleet, is_rollout):
     found = {entry["verdict"] for entry in fleet}
     for verdict, allowed in _WHOLE:
-        if found <= allowed:
+        if found <= allowed and not (is_rollout and verdict == "undone"):
             return verdict
-    if "refused" in found and not found & {"applied", "failed", "incomplete", "undone"}:
+    if "refused" in found and not found & {"applied", "failed", "incomplete", "running", "undone"}:
         return "refused"
     return "unfinished" if found <= {"applied", "unchanged", "checked", "untouched"} else "stopped"
 
@@ -208,6 +208,7 @@ def as_json(document):
         "patches": document.get("patches") or [],
         "started": document.get("started"),
         "ended": document.get("ended"),
+        "rollout": bool(document.get("rollout")),
         "fleet": in_order(document.get("fleet") or []),
     }
     return json.dumps(whole, indent=1, sort_keys=False) + "\n"

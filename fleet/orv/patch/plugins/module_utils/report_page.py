@@ -38,9 +38,9 @@ _HEAD = """<!DOCTYPE html>
 _SENTENCES = {
     "applied": "Every home has the patches.",
     "checked": "Nothing stands in the way on any home; nothing was changed.",
-    "unchanged": "Every home had the patches before; nothing was changed.",
-    "undone": "Every home is as it was before.",
-    "refused": "A home refuses the patches; nothing was changed anywhere.",
+    "unchanged": "Nothing was changed on any home.",
+    "undone": "The patches were taken back wherever they were the last.",
+    "refused": "At least one home refuses; nothing was changed anywhere.",
     "stopped": "Not every home has the patches. What was not reached is as it was.",
     "unfinished": "The turn of some homes did not come.",
     "empty": "There is no home in this run.",

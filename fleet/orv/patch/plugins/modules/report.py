@@ -15,7 +15,8 @@ description:
 options:
   document:
     description:
-      - What was gathered, with the keys C(fleet) (a list of homes), C(patches), C(started) and C(ended).
+      - What was gathered, with the keys C(fleet) (a list of homes), C(patches), C(started), C(ended) and C(rollout)
+        (whether homes were to be brought to the patches).
       - Given as JSON text, that is with C(to_json), it passes the engine much faster than as a structure, which the
         engine turns into text and back.
       - Each home has C(host), C(home), C(batch), C(verdict), C(reason), C(started), C(ended), C(components),
@@ -85,13 +86,16 @@ from ansible_collections.orv.patch.plugins.module_utils.report_page import as_pa
 WRITERS = {"html": as_page, "json": as_json, "csv": as_csv}
 
 
-def replace(module, path, content):
-    """Writes a file whole or not at all."""
-    handle, fresh = tempfile.mkstemp(dir=module.tmpdir)
-    with os.fdopen(handle, "wb") as target:
-        target.write(content)
-    module.atomic_move(fresh, path)
-    os.chmod(path, 0o600)
+def replace(path, content):
+    """Writes a file whole or not at all; at no moment others can read it."""
+    handle, fresh = tempfile.mkstemp(dir=os.path.dirname(path), prefix=".")
+    try:
+        with os.fdopen(handle, "wb") as target:
+            target.write(content)
+        os.rename(fresh, path)
+    except (IOError, OSError):
+        os.unlink(fresh)
+        raise
 
 
 def is_same(path, content):
@@ -125,7 +129,7 @@ def main():
         try:
             os.makedirs(dest, exist_ok=True)
             for kind in stale:
-                replace(module, paths[kind], contents[kind])
+                replace(paths[kind], contents[kind])
         except (IOError, OSError) as error:
             module.fail_json(msg="the report cannot be written: %s" % error)
     # Nor does it go back with the answer.
