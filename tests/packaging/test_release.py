@@ -88,7 +88,8 @@ def check_sources(clone, version):
 
 
 def check_spdx(document, sums, artefacts):
-    """Every file of the release with its digest, and for each program all that is in it or made it."""
+    """Every file of the release with its digest; for each program all that is in it or made it, and what made the
+    collection."""
     assert (document["spdxVersion"], document["dataLicense"]) == ("SPDX-2.3", "CC0-1.0")
     packages = {package["SPDXID"]: package for package in document["packages"]}
     assert len(packages) == len(document["packages"])
@@ -102,6 +103,12 @@ def check_spdx(document, sums, artefacts):
     ends = {end for one, _, other in related for end in (one, other)}
     assert ends == {"SPDXRef-DOCUMENT", *packages}
     for name, package in files.items():
+        tools = {packages[one]["name"] for one, kind, other in related
+                 if other == package["SPDXID"] and kind == "BUILD_TOOL_OF"}
+        if name.startswith("orv-patch-"):
+            assert tools == {"ansible-core", "gzip", "tar"}, name
+        elif name.endswith((".deb", ".rpm")):
+            assert {"cmake", "g++-12", "ninja-build"} <= tools and "ansible-core" not in tools, name
         linked = {packages[other]["name"] for one, kind, other in related
                   if one == package["SPDXID"] and kind.endswith("_LINK")}
         if name.endswith((".deb", ".rpm")):
