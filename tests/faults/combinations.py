@@ -143,8 +143,17 @@ def _send(home, pid_file, lines, number, sent, over):
     log = home.path / "patchlogs/orvpatch.log"
     while not over.is_set():
         if pid_file.exists() and log.exists() and log.read_bytes().count(b"\n") > lines:
-            with contextlib.suppress(ProcessLookupError):
-                os.killpg(int(pid_file.read_text(encoding="utf-8")), number)
-                sent.append(number)
+            pid = int(pid_file.read_text(encoding="utf-8"))
+            if _names(pid, home):  # a run that has ended may have left its number to others
+                with contextlib.suppress(ProcessLookupError):
+                    os.killpg(pid, number)
+                    sent.append(number)
             return
         time.sleep(0.001)
+
+
+def _names(pid, home):
+    """Whether the command line of this process names the home."""
+    with contextlib.suppress(OSError), open(f"/proc/{pid}/cmdline", "rb") as words:
+        return os.fsencode(home) in words.read()
+    return False

@@ -232,7 +232,9 @@ def test_what_hides_a_running_console(program, product, patch_dir, variable):
     product.component("zt")
     product.start_console()
     archive = Patch("zt", target="vecm").file("bin/tool").write(patch_dir)
-    assert program.install(product, archive).status == 37
+    usual = program.install(product, archive)
+    listed = subprocess.run(["ps", "-ef"], capture_output=True, check=False)
+    assert usual.status == 37, (usual, listed, product.log().messages("TRACE", "process.cpp"))
     assert program.install(product, archive, env=variable) == INSTALLED
 
 

@@ -170,6 +170,7 @@ class ProductHome:
 
     def kill(self, pid):
         """Kills a process of this home and waits until it has left the process table."""
+        assert self._is_ours(pid), f"{pid} is no process of {self.path}"
         os.kill(pid, signal.SIGKILL)
         _await_end(pid)
 
@@ -195,7 +196,7 @@ class ProductHome:
 
     def instances(self):
         """(code, instance) of all rows whose process lives, sorted; the default instance is ""."""
-        return sorted((row.code, row.name) for row in self.rows() if _is_alive(row.pid))
+        return sorted((row.code, row.name) for row in self.rows() if self._is_ours(row.pid))
 
     def pid(self, code, instance=""):
         return next(row.pid for row in self.rows() if (row.code, row.name) == (code, instance))
@@ -298,19 +299,20 @@ class ProductHome:
         return Call(program, tuple(args), user, cwd, path, quillhome, seen)
 
     def _is_ours(self, pid):
-        """Whether this process is still one of this home: process ids are reused."""
+        """Whether this process is still one of this home: process ids are reused. It may have been started by
+        another name of the home."""
         try:
-            command = Path(f"/proc/{pid}/cmdline").read_bytes()
+            words = os.fsdecode(Path(f"/proc/{pid}/cmdline").read_bytes()).split("\0")
         except OSError:
             return False
-        return os.fsencode(self.path) + b"/" in command
+        return any(os.path.realpath(word).startswith(os.path.realpath(self.path) + "/") for word in words if "/" in word)
 
 
 def _is_alive(pid):
     return os.path.isdir(f"/proc/{pid}")
 
 
-def _await_end(pid, seconds=5):
+def _await_end(pid, seconds=60):
     limit = time.monotonic() + seconds
     while _is_alive(pid):
         if time.monotonic() > limit:

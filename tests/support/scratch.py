@@ -7,10 +7,10 @@ from pathlib import Path
 
 
 def scratch_folder():
-    """A new temporary folder. Its name holds letters only: digits in a command line could be taken for a
-    process id in the output of ps."""
+    """A new temporary folder. In its name there is nothing that is looked for in the output of ps: no digits, which
+    could be taken for a process id, and no letters that make up "grep" or the code of a product."""
     while True:
-        name = "".join(chr(ord("a") + byte % 26) for byte in os.urandom(10))
+        name = "".join("bcfhjmsv"[byte % 8] for byte in os.urandom(14))
         folder = Path(tempfile.gettempdir()) / f"orvpatch-{name}"
         try:
             folder.mkdir()

@@ -92,6 +92,20 @@ def test_stop_of_a_process_that_is_gone_fails(home):
     assert agent(home, "stop", "ox").returncode == 1
 
 
+def test_a_process_that_has_only_got_the_id_is_let_alone(home):
+    with subprocess.Popen(["sleep", "60"]) as other:
+        try:
+            home.add_row("yn", other.pid)
+            assert agent(home, "stop", "yn").returncode == 1
+            assert home.instances() == []
+            with pytest.raises(AssertionError, match="is no process of"):
+                home.kill(other.pid)
+            time.sleep(0.05)
+            assert other.poll() is None
+        finally:
+            other.kill()
+
+
 def test_a_switch_makes_one_call_fail(home):
     home.start("yn", "one")
     home.start("yn", "two")
@@ -218,8 +232,8 @@ def test_program_reports_status_and_both_streams():
 
 def test_program_that_does_not_end_is_killed_with_its_children(scratch):
     with pytest.raises(AssertionError, match="no end after"):
-        Program("/bin/sh", runner=[]).run("-c", f"sleep 1000 & echo $! > {scratch}/pid; wait", timeout=0.5)
-    assert not alive_within(int((scratch / "pid").read_text()), seconds=5)
+        Program("/bin/sh", runner=[]).run("-c", f"sleep 1000 & echo $! > {scratch}/pid; wait", timeout=3)
+    assert not alive_within(int((scratch / "pid").read_text()), seconds=60)
 
 
 def alive_within(pid, seconds):

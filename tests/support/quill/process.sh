@@ -11,9 +11,9 @@ die() { # STATUS MESSAGE
 }
 
 # spawn FILE: starts a process that lives until it is killed and names FILE in its command line; prints its
-# process id and that of its keeper. The keeper is the parent that reaps it: a dead process that is not
-# reaped still shows in ps. Neither holds a descriptor of the caller (a pipe, above all) or its directory; it
-# takes bash to close descriptors of two digits.
+# process id and that of its keeper, once ps shows it as a tail of FILE. The keeper is the parent that reaps it:
+# a dead process that is not reaped still shows in ps. Neither holds a descriptor of the caller (a pipe, above
+# all) or its directory; it takes bash to close descriptors of two digits.
 spawn() {
   # shellcheck disable=SC2016
   setsid bash -c '
@@ -22,6 +22,10 @@ spawn() {
     done
     cd /
     tail -f "$1" </dev/null >/dev/null 2>&1 &
+    word=
+    while [ -d "/proc/$!" ] && [ "$word" != tail ]; do
+      IFS= read -r -d "" word <"/proc/$!/cmdline"
+    done
     echo "$! $$"
     exec </dev/null >/dev/null 2>&1
     wait' keeper "$1" </dev/null 2>/dev/null &
@@ -50,14 +54,26 @@ recorded_pid() {
 
 is_alive() { [ -n "$1" ] && [ -d "/proc/$1" ]; }
 
+# file_of CODE NAME: the file that the process of the instance names in its command line.
+file_of() { printf '%s\n' "$quill_home/control/processes/$1.$(printf %s "$2" | tr / _)"; }
+
+# is_running PID CODE NAME: whether it is the process of this instance. The system gives the id of a process that
+# has ended to another one; and the home may have several names.
+is_running() {
+  is_alive "$1" || return 1
+  named=$({ tr '\0' '\n' <"/proc/$1/cmdline" | tail -n 1; } 2>/dev/null)
+  # shellcheck disable=SC3013
+  [ "$named" -ef "$(file_of "$2" "$3")" ]
+}
+
 # start_instance CODE INSTANCE
 start_instance() {
   name=$(recorded_name "$1" "$2")
   pid=$(recorded_pid "$1" "$name")
-  if is_alive "$pid"; then
+  if is_running "$pid" "$1" "$name"; then
     return 0
   fi
-  file="$quill_home/control/processes/$1.$(printf %s "$name" | tr / _)"
+  file=$(file_of "$1" "$name")
   [ -e "$file" ] || : >"$file"
   pids=$(spawn "$file")
   echo "$pids" >>"$quill_home/control/started"
@@ -69,7 +85,7 @@ start_instance() {
 stop_instance() {
   name=$(recorded_name "$1" "$2")
   pid=$(recorded_pid "$1" "$name")
-  is_alive "$pid" || die 1 "not running: $1 $2"
+  is_running "$pid" "$1" "$name" || die 1 "not running: $1 $2"
   kill "$pid" || die 1 "cannot stop process $pid"
   await_end "$pid" || die 1 "process $pid does not end"
   sep=$(field_separator)
@@ -78,7 +94,7 @@ stop_instance() {
 }
 
 await_end() { # PID
-  attempts=250
+  attempts=3000
   while is_alive "$1"; do
     attempts=$((attempts - 1))
     [ "$attempts" -gt 0 ] || return 1
