@@ -120,6 +120,12 @@ class Site:
 _WAIT = 'touch "$QUILLHOME/waiting-{0}"; while [ ! -e "$QUILLHOME/go-{0}" ]; do sleep 0.02; done'
 
 
+def _take_signals():
+    """Some are ignored where the tests run in the background, or without a terminal."""
+    for number in (signal.SIGINT, signal.SIGQUIT, signal.SIGHUP):
+        signal.signal(number, signal.SIG_DFL)
+
+
 class Running:
     """An installation under way: a command of its patch waits until `finish` lets it go."""
 
@@ -128,7 +134,8 @@ class Running:
         patch = Patch(code, **fields).file(f"bin/{code}").script("a.sh", "pre", body=_WAIT.format(code))
         command = [*site.program.argv, "-h", site.home, "-i", patch.write(site.patch_dir)]
         self.process = subprocess.Popen(command, env={**os.environ, **site.env}, start_new_session=True,
-                                        stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL)
+                                        stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+                                        preexec_fn=_take_signals)
         limit = time.monotonic() + 30
         while not site.home.exists(f"waiting-{code}"):
             assert time.monotonic() < limit
