@@ -12,9 +12,9 @@ zpty -w shell "compadd() {
 }"
 zpty -w shell "bindkey '^I' complete-word; bindkey -r '^Xz'; done-with-it() { print end >>$hits.end }; zle -N done-with-it; bindkey '^Xz' done-with-it"
 zpty -w shell "print ready >$hits.ready"
-for wait in {1..200}; do [[ -s $hits.ready ]] && break; sleep 0.02; done
+for wait in {1..3000}; do [[ -s $hits.ready ]] && break; sleep 0.02; done
 zpty -w -n shell "$2"$'\t'$'\x18z'
-for wait in {1..200}; do [[ -s $hits.end ]] && break; sleep 0.02; done
+for wait in {1..3000}; do [[ -s $hits.end ]] && break; sleep 0.02; done
 sort -u $hits
 zpty -d shell
 rm -f $hits $hits.ready $hits.end

@@ -59,7 +59,7 @@ def ask(words, folder):
         stdin=subprocess.DEVNULL,
         capture_output=True,
         text=True,
-        timeout=30,
+        timeout=150,
     )
     assert done.stderr == ""
     return done.stdout.splitlines()
