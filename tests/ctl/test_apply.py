@@ -1,5 +1,6 @@
 """apply and undo: an installation that can be taken back to the byte."""
 
+import contextlib
 import json
 import os
 import subprocess
@@ -279,25 +280,33 @@ def test_the_newest_five_are_kept(ctl, ready, write):
 
 def test_a_second_transaction_and_a_plain_run_are_refused(ctl, ready, write, program):
     home = ready
-    path = write(a_patch().script("slow.sh", when="pre", body="sleep 4"))
-    first = subprocess.Popen([*ctl.program.argv, "apply", str(home.path), str(path), "--yes"],
-                             stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
-    deadline = time.monotonic() + 60
-    while not (home.path / "tmp/kyn/slow.sh").exists() or not home.exists("journal") or not home.calls():
-        assert time.monotonic() < deadline
-        time.sleep(0.05)
-    result = ctl.run("apply", home, path, "--yes")
-    assert (result.status, b"another transaction" in result.err) == (1, True)
-    assert ctl.run("undo", home).status == 1
-    assert first.wait(120) == 0
-    plain = subprocess.Popen([*program.argv, "-h", str(home.path), "-i", str(path)], stdout=subprocess.DEVNULL)
-    deadline = time.monotonic() + 60
-    while len(home.calls()) < 2:
-        assert time.monotonic() < deadline
-        time.sleep(0.05)
-    document = apply(ctl, home, path, status=1)
-    assert "other-run" in [finding["rule"] for finding in document["findings"]]
-    assert plain.wait(120) == 0
+    body = 'while [ ! -e "$quill_home/go" ]; do sleep 0.05; done'
+    path = write(a_patch().script("slow.sh", when="pre", body=body))
+    with at_work(home, [*ctl.program.argv, "apply", str(home.path), str(path), "--yes"]):
+        result = ctl.run("apply", home, path, "--yes")
+        assert (result.status, b"another transaction" in result.err) == (1, True)
+        assert ctl.run("undo", home).status == 1
+    with at_work(home, [*program.argv, "-h", str(home.path), "-i", str(path)]):
+        document = apply(ctl, home, path, status=1)
+        assert "other-run" in [finding["rule"] for finding in document["findings"]]
+
+
+@contextlib.contextmanager
+def at_work(home, words):
+    """Meanwhile the command of the patch waits, which ends when the file `go` is in the home."""
+    calls = len(home.calls())
+    run = subprocess.Popen(words, stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
+    try:
+        deadline = time.monotonic() + 60
+        while len(home.calls()) == calls:
+            assert time.monotonic() < deadline
+            time.sleep(0.05)
+        yield
+    finally:
+        home.write("go")
+        status = run.wait(120)
+        home.remove("go")
+    assert status == 0
 
 
 def test_sample_home_with_live_agents(ctl, scratch):

@@ -1,7 +1,6 @@
 """check: each rule for the host, on a home on which the installer really fails or harms in that way."""
 
 import os
-import pwd
 import shutil
 import socket
 import subprocess
@@ -11,6 +10,11 @@ from pathlib import Path
 import pytest
 
 from support import Patch, stubs
+from support.program import identity
+
+
+# What a command of a patch does until the file `go` is in the home.
+WAIT = 'while [ ! -e "$quill_home/go" ]; do sleep 0.05; done'
 
 
 @pytest.fixture
@@ -242,9 +246,8 @@ def test_host_prefix(ctl, ready, patch):
 
 @pytest.mark.needs_root
 def test_an_owner_without_an_account(ctl, ready, patch):
-    sleeper = subprocess.Popen(["setpriv", "--reuid=54321", "--clear-groups", "sleep", "60"])
+    sleeper = subprocess.Popen(["sleep", "60"], **identity(54321))
     try:
-        time.sleep(0.3)
         ready.add_row("yn", sleeper.pid, "one")
         assert found(check(ctl, ready, patch, "--no-report", status=1), "owner-unknown") == [("error", "kyn one")]
     finally:
@@ -257,10 +260,8 @@ def test_an_owner_whose_name_ps_cuts(ctl, ready, patch):
     name = "orvlongname"
     subprocess.run(["useradd", "-M", name], check=True)
     try:
-        user = pwd.getpwnam(name).pw_uid
-        sleeper = subprocess.Popen(["setpriv", f"--reuid={user}", "--clear-groups", "sleep", "60"])
+        sleeper = subprocess.Popen(["sleep", "60"], **identity(name))
         try:
-            time.sleep(0.3)
             ready.add_row("yn", sleeper.pid, "one")
             assert found(check(ctl, ready, patch, "--no-report", status=1), "owner-truncated") == [
                 ("error", "kyn one")]
@@ -305,7 +306,8 @@ def test_clock_behind(ctl, ready, write):
 
 
 def test_other_run(ctl, ready, patch, write, program):
-    slow = write(Patch("yn").file("lib/a").script("slow.sh", when="pre", body="sleep 5"), filename="kyn_unix_vema_a.tar")
+    waiting = Patch("yn").file("lib/a").script("slow.sh", when="pre", body=WAIT)
+    slow = write(waiting, filename="kyn_unix_vema_a.tar")
     ready.component("yn", arch="unix")
     run = subprocess.Popen([*program.argv, "-h", str(ready.path), "-i", str(slow)], stdout=subprocess.DEVNULL)
     try:
@@ -318,6 +320,7 @@ def test_other_run(ctl, ready, patch, write, program):
         assert document["report"] is None
         assert ready.exists("tmp/kyn/slow.sh")
     finally:
+        ready.write("go")
         assert run.wait(60) == 0
 
 
