@@ -167,7 +167,7 @@ def waits_for_ever(stage):
                                stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL, start_new_session=True,
                                **identity(user))
     try:
-        while not any("pipe" in place for place in _waits_of(process.pid)):
+        while not any("pipe_write" in place for place in _waits_of(process.pid)):
             assert process.poll() is None, "the run has ended"
             time.sleep(0.1)
     finally:
