@@ -52,8 +52,8 @@ class Browser:
             time.sleep(0.05)
 
     def run(self, expression):
-        """The value of an expression in the page."""
-        answer = self.ask("Runtime.evaluate", expression=expression, returnByValue=True)
+        """The value of an expression in the page, that of a promise when it is kept."""
+        answer = self.ask("Runtime.evaluate", expression=expression, returnByValue=True, awaitPromise=True)
         assert "exceptionDetails" not in answer, answer
         return answer["result"].get("value")
 
