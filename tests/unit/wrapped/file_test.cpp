@@ -6,6 +6,7 @@
 #include <string>
 #include <utility>
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 #include <unistd.h>
@@ -15,6 +16,7 @@
 namespace {
 
 namespace fs = std::filesystem;
+using ::testing::Contains;
 
 LogLine fileTrace(const std::string &message) {
   return trace("file.cpp", message);
@@ -65,6 +67,7 @@ TEST_F(FileFailureTest, LinkMovesWhenTheModeOfItsDestinationCannotBeSet) {
   File link(source());
   EXPECT_TRUE(link.moveFile(target(), true));
   EXPECT_TRUE(fs::is_symlink(target()));
+  EXPECT_THAT(logLines(), Contains(fileTrace("unable to chmod for file: " + target())));
 }
 
 TEST_F(FileFailureTest, OnlyMissingPathsAreNotLogged) {

@@ -53,24 +53,27 @@ struct Refused {
   const char *name;
   int after;
   mode_t mode;
+  bool linkStays;
 };
 
 class RefusedOpeningTest : public NewDirectoriesFailureTest, public ::testing::WithParamInterface<Refused> {};
 
-TEST_P(RefusedOpeningTest, EndsTheWalkAndLeavesTheModes) {
+TEST_P(RefusedOpeningTest, LeavesTheModes) {
   const std::string inner = makeDirectory("tree/inner");
+  fs::create_symlink("/nowhere", inner + "/link");
   ASSERT_EQ(chmod(inner.c_str(), GetParam().mode), 0);
   failCall("openat", EMFILE).on(GetParam().name).after(GetParam().after);
   removeSymbolicLinks(home() + "tree");
   restoreSystemCalls();
   EXPECT_EQ(modeOf(inner), GetParam().mode);
+  EXPECT_EQ(fs::is_symlink(inner + "/link"), GetParam().linkStays);
 }
 
 // A directory is opened three times: to be held, to be entered, and for the way back from those below it.
 INSTANTIATE_TEST_SUITE_P(Openings, RefusedOpeningTest,
-                         ::testing::Values(Refused{"inner", 0, 0755}, Refused{"inner", 1, 0755},
-                                           Refused{"inner", 1, 0500}, Refused{".", 0, 0755},
-                                           Refused{".", 1, 0755}, Refused{"..", 0, 0500}));
+                         ::testing::Values(Refused{"inner", 0, 0755, true}, Refused{"inner", 1, 0755, true},
+                                           Refused{"inner", 1, 0500, true}, Refused{".", 0, 0755, true},
+                                           Refused{".", 1, 0755, true}, Refused{"..", 0, 0500, false}));
 
 TEST_F(NewDirectoriesFailureTest, LinksOfADirectoryThatStaysClosedAreRemovedAllTheSame) {
   const std::string closed = makeDirectory("tree/closed");
