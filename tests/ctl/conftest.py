@@ -7,6 +7,7 @@ from pathlib import Path
 import jsonschema
 import pytest
 
+from callfaults import SEED
 from support import Patch, Program
 
 CHECKOUT = Path(__file__).resolve().parents[2]
@@ -36,6 +37,12 @@ class Ctl:
         schema = SCHEMAS / f"{command}.json"
         assert schema.exists(), f"no schema for {command}"
         return json.loads(schema.read_text())
+
+
+@pytest.fixture(scope="module")
+def seed():
+    """Says how the choice of a test can be repeated."""
+    print(f"ORVPATCH_SEED={SEED}")
 
 
 @pytest.fixture

@@ -31,6 +31,14 @@ def listing(home):
     return found
 
 
+def assert_taken_back(result, after, before):
+    """An undo has ended well, or had nothing to do, and the home is as before; whether it had anything to do."""
+    nothing = b"no transaction that could be undone" in result.err or b"nothing to undo" in result.err
+    assert result.status == 0 or nothing, result
+    assert after == before, result
+    return result.status == 0
+
+
 def _describe(path, status):
     is_directory = stat.S_ISDIR(status.st_mode)
     return {

@@ -10,7 +10,7 @@ import time
 
 import pytest
 
-from oracle import listing
+from oracle import assert_taken_back, listing
 from powerloss import MAKE, power_supply
 from support import Patch, ProductHome
 
@@ -85,11 +85,9 @@ class Trial:
         """After the power is back; whether there was anything to take back."""
         with self.supply.mounted(copy):
             result = self.ctl.run("undo", self.home)
-            nothing = b"no transaction that could be undone" in result.err or b"nothing to undo" in result.err
-            assert result.status == 0 or nothing, result
-            assert listing(self.home) == self.before, result
+            undone = assert_taken_back(result, listing(self.home), self.before)
         self.supply.remove(copy)
-        return result.status == 0
+        return undone
 
 
 @pytest.mark.parametrize("name", ["apply", "undo"])
@@ -106,3 +104,4 @@ def test_power_fails(ctl, patch_dir, kind, name):
             taken += len(copies)
             undone += sum([trial.judge(copy) for copy in copies])
         print(f"{kind}, {name}: {taken} moments, {undone} of them with something to take back")
+        assert undone or not FULL  # a few moments may all lie before the first change

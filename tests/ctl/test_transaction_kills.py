@@ -6,24 +6,20 @@ A rotating sample in every run; ORVPATCH_FAULTS=all kills before each call. ORVP
 import os
 import random
 import re
-import time
 from collections import Counter
+from functools import partial
 
 import pytest
 
-from oracle import listing
+from callfaults import SEED, outlived
+from oracle import assert_taken_back, listing
 from support import Patch, ProductHome
 
 CHANGING = ("link", "linkat", "rename", "unlink", "unlinkat", "mkdir", "rmdir", "openat", "write", "fchmod", "fchown",
             "fchmodat", "chmod", "chown", "ftruncate", "fsync", "syncfs", "utimensat")
-SEED = int(os.environ.get("ORVPATCH_SEED") or random.randrange(10**6))
 SAMPLE = None if os.environ.get("ORVPATCH_FAULTS") == "all" else 6
 _CALL = re.compile(r"^(\w+)\(")
-
-
-@pytest.fixture(scope="module", autouse=True)
-def seed():
-    print(f"ORVPATCH_SEED={SEED}")
+pytestmark = pytest.mark.usefixtures("seed")
 
 
 class Bench:
@@ -65,16 +61,8 @@ class Bench:
 
     def take_back(self, home, expected):
         """Waits for an installer that outlived its caller, then undoes what there is."""
-        limit = time.monotonic() + 120
-        while True:
-            result = self.ctl.run("undo", home)
-            if b"at work" not in result.err:
-                break
-            assert time.monotonic() < limit, result
-            time.sleep(0.1)
-        nothing = b"no transaction that could be undone" in result.err or b"nothing to undo" in result.err
-        assert result.status == 0 or nothing, result
-        assert listing(home) == expected
+        result = outlived(lambda: self.ctl.run("undo", home))
+        assert_taken_back(result, listing(home), expected)
 
 
 @pytest.fixture
@@ -136,11 +124,6 @@ def test_apply_is_killed_and_given_again(bench):
     for call in chosen(calls)[:3]:
         with bench.home() as home:
             bench.kill(call, "apply", home, bench.patch, "--yes")
-            limit = time.monotonic() + 120
-            while True:
-                result = bench.run("apply", home, bench.patch, "--yes")
-                if b"other-run" not in result.out or time.monotonic() > limit:
-                    break
-                time.sleep(0.1)
+            result = outlived(partial(bench.run, "apply", home, bench.patch, "--yes"))
             assert result.status == 0, (call, result)
             assert {path: entry["content"] for path, entry in listing(home).items()} == wanted, call
