@@ -1,14 +1,17 @@
 // Programs that orvpatchctl runs, and checksums.
 #include "child.h"
 
+#include <chrono>
 #include <csignal>
 #include <cstdlib>
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
 #include "checksums.h"
 #include "judgement.h"
 #include "scratch.h"
+#include "signals.h"
 
 namespace {
 
@@ -48,6 +51,24 @@ TEST(CtlChild, ProgramThatIsNotFoundHasStatus127) {
   EXPECT_EQ(runChild({"no-such-program"}, environment).status, 127);
   EXPECT_EQ(findProgram("no-such-program", environment.path), "");
   EXPECT_EQ(findProgram("sh", "/nowhere:/bin"), "/bin/sh");
+}
+
+/// In a process of its own: what is noted stays noted.
+TEST(CtlChildDeathTest, AnInterruptionThatCameBeforeTheWaitEndsIt) {
+  const auto interrupted = [] {
+    static_cast<void>(signal(SIGTERM, SIG_DFL));
+    const InterruptionCatcher catcher;
+    static_cast<void>(raise(SIGTERM));
+    try {
+      runChild({"sleep", "30"}, environment);
+    } catch (const Interrupted &interruption) {
+      _exit(interruption.signal);
+    }
+    _exit(0);
+  };
+  const auto start = std::chrono::steady_clock::now();
+  EXPECT_EXIT(interrupted(), testing::ExitedWithCode(SIGTERM), "");
+  EXPECT_LT(std::chrono::steady_clock::now() - start, std::chrono::seconds(25));
 }
 
 class CtlChecksums : public ScratchHome {};
