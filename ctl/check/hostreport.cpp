@@ -1,6 +1,7 @@
 #include "check/hostreport.h"
 
 #include <algorithm>
+#include <filesystem>
 #include <iterator>
 #include <utility>
 
@@ -8,6 +9,7 @@
 #include "dcfpackageprocessor.h"
 #include "file.h"
 #include "lint/lint.h"
+#include "signals.h"
 #include "utilities.h"
 
 namespace {
@@ -49,18 +51,37 @@ std::string trimmed(std::string text) {
   return text;
 }
 
-/// A report that ends with an error leaves what it has extracted. None of it was there before: a left-over
+/// The tar of a report that was killed goes on until its directory has gone, and may fill it meanwhile.
+void removeWhole(const std::string &directory) {
+  constexpr int Most = 100;
+  std::error_code error = std::make_error_code(std::errc::directory_not_empty);
+  for (int tries = 0; tries < Most && error == std::errc::directory_not_empty; ++tries)
+    std::filesystem::remove_all(directory, error);
+}
+
+/// A report that does not end well leaves what it has extracted. None of it was there before: a left-over
 /// keeps the report from being run.
 void removeExtracted(const HostCheck &check) {
   for (const std::string &code : check.temporaryCodes())
     if (!code.empty() && code != "." && code != ".." && code.find('/') == std::string::npos)
-      static_cast<void>(
-          runChild({"rm", "-rf", "--", check.home + "tmp/" + code}, {"/usr/bin:/bin", {"LC_ALL=C"}}));
+      removeWhole(check.home + "tmp/" + code);
+}
+
+ChildResult report(const HostCheck &check, const InstallerOptions &installer, const std::string &path) {
+  try {
+    const ChildResult result = runReport(installer, check.home, path);
+    removeExtracted(check);
+    return result;
+  } catch (...) {
+    removeExtracted(check);
+    throw;
+  }
 }
 
 } // namespace
 
 CheckResult checkInstallation(const Home &home, const std::string &path, const CheckOptions &options) {
+  const InterruptionCatcher catcher;
   CheckResult result;
   result.findings = lint(path);
   HostCheck check = subjectOf(home, path, options);
@@ -70,12 +91,12 @@ CheckResult checkInstallation(const Home &home, const std::string &path, const C
   checkTools(check);
   checkSignatures(check);
   if (options.withReport && !wouldHarm(check.findings()) && !wouldHarm(result.findings)) {
-    result.report = runReport(options.installer, home.path(), path);
-    removeExtracted(check);
+    result.report = report(check, options.installer, path);
     if (result.report->status != 0)
       check.add("installer-refuses", "", "status " + std::to_string(result.report->status),
                 trimmed(result.report->err));
   }
+  stopIfInterrupted();
   std::move(check.findings().begin(), check.findings().end(), std::back_inserter(result.findings));
   return result;
 }

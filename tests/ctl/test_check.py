@@ -2,6 +2,7 @@
 
 import os
 import shutil
+import signal
 import socket
 import subprocess
 import time
@@ -64,6 +65,22 @@ def test_a_refused_report_leaves_nothing_in_tmp(ctl, ready, write):
     for _ in range(2):
         assert found(check(ctl, ready, path, status=1), "installer-refuses")
     assert os.listdir(ready.path / "tmp") == []
+
+
+@pytest.mark.parametrize("command", [("check",), ("apply", "--yes")])
+@pytest.mark.parametrize("number", ["INT", "TERM"])
+def test_an_interrupted_report_leaves_nothing_in_tmp(ctl, program, ready, patch, scratch, command, number):
+    interrupted = scratch / "interrupted"
+    interrupted.write_text('#!/bin/sh\nmkdir "$2/tmp/kyn" && tar -xf "$4" -C "$2/tmp/kyn" || exit 99\n'
+                           f': >{scratch}/extracted\nkill -{number} $PPID\nexec sleep 60\n')
+    interrupted.chmod(0o755)
+    result = ctl.run(command[0], ready, patch, *command[1:], "--installer", interrupted,
+                     wrapper=["env", "--default-signal"])
+    assert result.status == -signal.Signals[f"SIG{number}"], result
+    assert (scratch / "extracted").exists()
+    assert os.listdir(ready.path / "tmp") == []
+    assert not ready.exists("patchlogs/transactions") or os.listdir(ready.path / "patchlogs/transactions") == []
+    assert ctl.run("apply", ready, patch, "--yes", "--installer", program.binary).status == 0
 
 
 def test_the_report_changes_log_and_tmp_alone(ctl, ready, patch):
