@@ -9,12 +9,14 @@
 #include "judgement.h"
 
 // The descriptor is closed on exec, so that no child keeps the lock alive.
-HomeLock::HomeLock(const std::string &home) : directory_(home.c_str(), O_RDONLY | O_DIRECTORY), held_(false) {
+HomeLock::HomeLock(const std::string &home) : directory_(home.c_str(), O_RDONLY | O_DIRECTORY) {
   if (!directory_.isOpen())
     throw JudgementError("cannot open " + home + ": " + strerror(errno));
-  held_ = flock(directory_.get(), LOCK_EX | LOCK_NB) == 0;
-  if (!held_ && errno != EWOULDBLOCK)
-    throw JudgementError("cannot lock " + home + ": " + strerror(errno));
+  if (flock(directory_.get(), LOCK_EX | LOCK_NB) == 0)
+    return;
+  if (errno == EWOULDBLOCK)
+    throw RefusalError("another transaction is at work on " + home);
+  throw JudgementError("cannot lock " + home + ": " + strerror(errno));
 }
 
 bool isHomeLocked(const std::string &home) {

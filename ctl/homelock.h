@@ -7,14 +7,12 @@
 
 class HomeLock {
 public:
-  /// Takes the lock of the home's directory. JudgementError when the home cannot be opened.
+  /// Takes the lock of the home's directory. RefusalError when another process holds it; JudgementError when
+  /// the home cannot be opened.
   explicit HomeLock(const std::string &home);
-  /// False when another process holds it.
-  bool isHeld() const { return held_; }
 
 private:
   FileDescriptor directory_;
-  bool held_;
 };
 
 /// Whether a process holds the lock now.

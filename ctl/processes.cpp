@@ -83,6 +83,12 @@ std::vector<std::string> installerRuns(const std::string &home) {
   return runs;
 }
 
+void demandNoRun(const std::string &home) {
+  const std::vector<std::string> runs = installerRuns(home);
+  if (!runs.empty())
+    throw RefusalError("an installation is at work: " + runs.front());
+}
+
 bool ownerOf(const std::string &pid, uid_t &user) {
   struct stat status = {};
   if (pid.empty() || pid.find_first_not_of("0123456789") != std::string::npos ||

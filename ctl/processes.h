@@ -10,6 +10,9 @@
 /// out.
 std::vector<std::string> installerRuns(const std::string &home);
 
+/// RefusalError when one is at work: files change under what is looked at.
+void demandNoRun(const std::string &home);
+
 /// Real user of a process, by the kernel; false when there is no such process.
 bool ownerOf(const std::string &pid, uid_t &user);
 

@@ -1,12 +1,12 @@
 #include "productkind.h"
 
-#include <map>
+#include "target.h"
 
 std::optional<std::string> fixedKindOf(const std::string &product) {
-  static const std::map<std::string, std::string> kinds = {
-      {"kqa", "vems"}, {"kpt", "veps"}, {"kdk", "vepd"}, {"kzt", "vecm"}};
-  const auto kind = kinds.find(product);
-  return kind == kinds.end() ? std::nullopt : std::optional(kind->second);
+  for (const Target &target : targets)
+    if (target.ownCode != nullptr && product == std::string("k") + target.ownCode)
+      return target.name;
+  return std::nullopt;
 }
 
 std::string kindOf(const std::string &product) {

@@ -12,7 +12,7 @@
 
 #include "check/hostcheck.h"
 #include "homelock.h"
-#include "judgement.h"
+#include "leftover.h"
 #include "look.h"
 #include "processes.h"
 
@@ -71,29 +71,13 @@ void checkTmp(HostCheck &check) {
     check.add("home-tmp", "", "tmp", ownerText(*status));
 }
 
-/// The first file below updated_files of a temporary directory that the home lacks; empty when it has them
-/// all.
-std::string onlyCopy(const std::string &home, const std::string &directory) {
-  const fs::path root = directory + "/updated_files";
-  std::error_code error;
-  for (fs::recursive_directory_iterator entry(root, error), end; !error && entry != end;
-       entry.increment(error)) {
-    const std::string relative = entry->path().string().substr(root.string().size() + 1);
-    if (!entry->is_directory(error) && !lookAt(home + relative))
-      return relative;
-  }
-  if (error && error != std::errc::no_such_file_or_directory)
-    throw JudgementError("cannot look through " + root.string() + ": " + error.message());
-  return "";
-}
-
 void checkLeftovers(HostCheck &check) {
   for (const std::string &code : check.temporaryCodes()) {
-    const std::string directory = check.home + "tmp/" + code;
-    const std::optional<struct stat> status = code.empty() ? std::nullopt : lookAt(directory);
+    const std::optional<struct stat> status =
+        code.empty() ? std::nullopt : lookAt(check.home + "tmp/" + code);
     if (!status)
       continue;
-    const std::string lacking = S_ISDIR(status->st_mode) ? onlyCopy(check.home, directory) : "";
+    const std::string lacking = S_ISDIR(status->st_mode) ? onlyCopyIn(check.home, "tmp/" + code) : "";
     if (lacking.empty())
       check.add("tmp-leftover", "", "tmp/" + code, "left by an earlier run");
     else

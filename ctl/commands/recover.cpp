@@ -77,19 +77,10 @@ void print(const Interruption &found, const std::vector<HomeState> &states) {
     printf("%s\n", terminalText(message).c_str());
 }
 
-/// Files change under what is looked at: nothing can be told.
-void demandQuiet(const Home &home) {
-  const std::vector<std::string> runs = installerRuns(home.path());
-  if (!runs.empty())
-    throw RefusalError("an installation is at work: " + runs.front());
-}
-
 void recover(const std::string &path, bool isToFix, Invocation &invocation) {
   const Home home(path);
   const HomeLock lock(home.path());
-  if (!lock.isHeld())
-    throw RefusalError("a transaction is at work on " + home.path());
-  demandQuiet(home);
+  demandNoRun(home.path());
   Interruption found = findInterruption(home);
   std::vector<HomeState> states = tellStates(home, found);
   if (isToFix)

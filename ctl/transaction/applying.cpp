@@ -183,11 +183,8 @@ private:
 
   void noteMissingInstances() {
     for (const RecordedInstance &before : record_.before)
-      if (std::none_of(record_.after.begin(), record_.after.end(), [&before](const RecordedInstance &now) {
-            return now.product == before.product && now.name == before.name;
-          }))
-        record_.differences.push_back({before.product + (before.name.empty() ? "" : " " + before.name),
-                                       "instance", "it ran before, and does not run now"});
+      if (!isAmong(record_.after, before))
+        record_.differences.push_back({nameOf(before), "instance", "it ran before, and does not run now"});
   }
 
   bool undo() {
@@ -234,8 +231,6 @@ private:
 Record applyPatches(const Home &home, const std::string &path, const ApplyOptions &options,
                     const ApplyDialogue &dialogue) {
   const HomeLock lock(home.path());
-  if (!lock.isHeld())
-    throw RefusalError("another transaction is at work on " + home.path());
   std::vector<std::string> messages;
   if (!options.dryRun)
     for (const std::string &id : takeBackInterrupted(home))

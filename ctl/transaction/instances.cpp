@@ -12,10 +12,6 @@ bool contains(const std::vector<std::string> &list, const std::string &text) {
   return std::find(list.begin(), list.end(), text) != list.end();
 }
 
-std::string nameOf(const RecordedInstance &instance) {
-  return instance.product + (instance.name.empty() ? "" : " " + instance.name);
-}
-
 } // namespace
 
 bool stopInstances(const Home &home, const std::vector<std::string> &products,
@@ -41,10 +37,7 @@ void startMissing(const Home &home, const std::vector<RecordedInstance> &wanted,
   const std::vector<RecordedInstance> running = runningInstances(home);
   const ORVComponentRegistry registry;
   for (const RecordedInstance &instance : wanted) {
-    const bool runs = std::any_of(running.begin(), running.end(), [&instance](const RecordedInstance &other) {
-      return other.product == instance.product && other.name == instance.name;
-    });
-    if (runs)
+    if (isAmong(running, instance))
       continue;
     ORVComponent *const component =
         registry.getInstalledComponent(instance.product, controlKind(instance.product));

@@ -1,16 +1,10 @@
 #include "transaction/page.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <cstdio>
 #include <cstring>
 #include <utility>
 
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
-
-#include "filedescriptor.h"
 #include "text.h"
 #include "transaction/pagestyle.h"
 
@@ -292,17 +286,11 @@ private:
     html_ += "<table>\n<thead><tr><th>Instance</th><th>User</th><th>Before</th><th>After</th></tr></thead>\n"
              "<tbody>\n";
     for (const RecordedInstance &instance : record_.before)
-      instanceRow(instance, true, runs(record_.after, instance));
+      instanceRow(instance, true, isAmong(record_.after, instance));
     for (const RecordedInstance &instance : record_.after)
-      if (!runs(record_.before, instance))
+      if (!isAmong(record_.before, instance))
         instanceRow(instance, false, true);
     html_ += "</tbody>\n</table>\n";
-  }
-
-  static bool runs(const std::vector<RecordedInstance> &all, const RecordedInstance &wanted) {
-    return std::any_of(all.begin(), all.end(), [&wanted](const RecordedInstance &instance) {
-      return instance.product == wanted.product && instance.name == wanted.name;
-    });
   }
 
   void instanceRow(const RecordedInstance &instance, bool before, bool after) {
@@ -355,16 +343,6 @@ private:
   const Record &record_;
   std::string html_;
 };
-
-/// 0 or an error number.
-int replaceFile(const std::string &path, const std::string &content) {
-  const std::string fresh = path + ".new";
-  static_cast<void>(unlink(fresh.c_str())); // one that was cut off may be in the way
-  FileDescriptor file(open(fresh.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
-  const bool written = file.isOpen() && file.write(content) && fsync(file.get()) == 0 && file.close() &&
-                       rename(fresh.c_str(), path.c_str()) == 0;
-  return written ? 0 : errno;
-}
 
 } // namespace
 

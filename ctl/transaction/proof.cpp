@@ -114,11 +114,8 @@ private:
   void compareInstances() {
     const std::vector<RecordedInstance> running = runningInstances(home_);
     for (const RecordedInstance &instance : record_.before)
-      if (std::none_of(running.begin(), running.end(), [&instance](const RecordedInstance &now) {
-            return now.product == instance.product && now.name == instance.name;
-          }))
-        found_.add(instance.product + (instance.name.empty() ? "" : " " + instance.name), "instance",
-                   "it ran before the installation, and does not run now");
+      if (!isAmong(running, instance))
+        found_.add(nameOf(instance), "instance", "it ran before the installation, and does not run now");
   }
 
   const Home &home_;

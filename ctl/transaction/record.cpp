@@ -1,5 +1,6 @@
 #include "transaction/record.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdio>
@@ -196,11 +197,21 @@ Json textOrNull(const std::string &text) {
   return text.empty() ? Json(nullptr) : Json(text);
 }
 
-[[noreturn]] void cannotWrite(const std::string &path) {
-  throw JudgementError("cannot write " + path + ": " + strerror(errno));
+[[noreturn]] void cannotWrite(const std::string &path, int error) {
+  throw JudgementError("cannot write " + path + ": " + strerror(error));
 }
 
 } // namespace
+
+std::string nameOf(const RecordedInstance &instance) {
+  return instance.product + (instance.name.empty() ? "" : " " + instance.name);
+}
+
+bool isAmong(const std::vector<RecordedInstance> &list, const RecordedInstance &instance) {
+  return std::any_of(list.begin(), list.end(), [&instance](const RecordedInstance &other) {
+    return other.product == instance.product && other.name == instance.name;
+  });
+}
 
 std::optional<FileState> stateOf(const std::string &path) {
   const std::optional<struct stat> status = lookAt(path);
@@ -261,20 +272,22 @@ Record parseRecord(const std::string &text) {
   }
 }
 
+int replaceFile(const std::string &path, const std::string &content) {
+  const std::string fresh = path + ".new";
+  static_cast<void>(unlink(fresh.c_str())); // one that was cut off may be in the way
+  FileDescriptor file(open(fresh.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW | O_CLOEXEC, 0600));
+  const bool isReplaced = file.isOpen() && file.write(content) && fsync(file.get()) == 0 && file.close() &&
+                          rename(fresh.c_str(), path.c_str()) == 0;
+  return isReplaced ? 0 : errno;
+}
+
 void writeRecord(const std::string &folder, const Record &record) {
   const std::string path = folder + "/record.json";
-  const std::string fresh = path + ".new";
-  {
-    FileDescriptor file(fresh.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_NOFOLLOW);
-    if (!file.isOpen() || !file.write(toJson(record).dump(1) + "\n") || fsync(file.get()) != 0 ||
-        !file.close())
-      cannotWrite(fresh);
-  }
-  if (rename(fresh.c_str(), path.c_str()) != 0)
-    cannotWrite(path);
+  if (const int error = replaceFile(path, toJson(record).dump(1) + "\n"))
+    cannotWrite(path, error);
   const FileDescriptor directory(folder.c_str(), O_RDONLY | O_DIRECTORY);
   if (!directory.isOpen() || fsync(directory.get()) != 0)
-    cannotWrite(folder);
+    cannotWrite(folder, errno);
 }
 
 Record readRecord(const std::string &folder) {

@@ -77,6 +77,11 @@ struct RecordedInstance {
   std::string user;
 };
 
+/// "kyn one"; of the default instance "kyn".
+std::string nameOf(const RecordedInstance &instance);
+/// Whether the list has the instance, as whichever process.
+bool isAmong(const std::vector<RecordedInstance> &list, const RecordedInstance &instance);
+
 struct RecordedStep {
   std::string step;
   double seconds = 0;
@@ -119,7 +124,10 @@ nlohmann::ordered_json toJson(const Record &record);
 /// JudgementError for a text that is no record.
 Record parseRecord(const std::string &text);
 
-/// Writes record.json in the transaction's folder: a new file, on disk, then renamed. JudgementError when it
+/// Puts a file with this content, on disk, in the place of the one at `path`; 0 or why it cannot.
+int replaceFile(const std::string &path, const std::string &content);
+
+/// Writes record.json in the transaction's folder, whole, and puts its name on disk. JudgementError when it
 /// cannot.
 void writeRecord(const std::string &folder, const Record &record);
 /// JudgementError when there is none.
