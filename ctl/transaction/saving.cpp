@@ -98,6 +98,13 @@ void restoreFile(const std::string &home, const std::string &folder, const Recor
     messages.push_back(file.path + ": cannot be removed: " + strerror(errno));
 }
 
+/// The names that old files were given to keep them. The files stay what they are by now.
+void removeSaved(const std::string &folder, const Record &record) {
+  for (const TouchedFile &file : record.files)
+    if (!file.saved.empty())
+      static_cast<void>(unlink(savedPath(folder, file.saved).c_str()));
+}
+
 /// Owner and mode of a file that had to be made anew. An ordinary user can give it to no other.
 bool giveAttributes(int file, const FileState &before) {
   const bool isGiven =
@@ -207,10 +214,15 @@ void noteInstalled(const std::string &home, Record &record) {
 
 void restoreFiles(const std::string &home, const std::string &folder, const Record &record,
                   std::vector<std::string> &messages) {
-  for (const TouchedFile &file : record.files)
-    restoreFile(home, folder, record, file, messages);
-  for (const RewrittenFile &file : record.rewritten)
-    restoreRewritten(home, folder, file, messages);
+  if (record.phase == Phase::Prepared) {
+    // The installer was not started: what differs from the record is the work of others.
+    removeSaved(folder, record);
+  } else {
+    for (const TouchedFile &file : record.files)
+      restoreFile(home, folder, record, file, messages);
+    for (const RewrittenFile &file : record.rewritten)
+      restoreRewritten(home, folder, file, messages);
+  }
   for (const std::string &directory : record.temporary)
     restoreTemporary(home, folder, record, directory, messages);
   for (auto directory = record.directories.rbegin(); directory != record.directories.rend(); ++directory)
@@ -232,6 +244,6 @@ void closeDirectories(const std::string &home, const Record &record, std::vector
                           (fchown(directory.get(), status.st_uid, status.st_gid) == 0 || errno == EPERM) &&
                           fchmod(directory.get(), status.st_mode & 07777) == 0;
     if (!isClosed)
-      messages.push_back(made.path + ": its mode stays open to everybody: " + strerror(errno));
+      messages.push_back(made.path + ": owner and mode cannot be set: " + strerror(errno));
   }
 }

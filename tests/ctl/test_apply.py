@@ -3,6 +3,7 @@
 import contextlib
 import json
 import os
+import signal
 import subprocess
 import time
 
@@ -321,3 +322,24 @@ def test_sample_home_with_live_agents(ctl, scratch):
         undo(ctl, home)
         assert home.instances() == running
         assert listing(home) == before
+
+
+def test_what_others_did_before_the_installation_began_stays(ctl, ready, write):
+    home = ready
+    for path in ("lib/replaced", "lib/other"):
+        home.write(path, "old\n")
+    archive = write(a_patch().file("lib/other", "new\n"))
+    result = ctl.run("apply", home, archive, "--yes",  # killed as it puts on disk what it has saved
+                     wrapper=["strace", "-o", "/dev/null", "-e", "inject=syncfs:signal=SIGKILL:when=1"])
+    assert result.status == -signal.SIGKILL, result
+    home.write("lib/new", "the administrator's\n")
+    home.remove("lib/replaced")
+    home.write("lib/replaced", "the administrator's\n")
+    home.component("yn", "06100005")
+    taken = undo(ctl, home)
+    assert (taken["verdict"], taken["messages"]) == ("undone", [])
+    for path in ("lib/new", "lib/replaced"):
+        assert home.read(path) == b"the administrator's\n"
+    assert (home.read("lib/other"), (home.path / "lib/other").stat().st_nlink) == (b"old\n", 1)
+    assert home.level("yn") == "06100005"
+    assert apply(ctl, home, archive)["verdict"] == "applied"
