@@ -92,6 +92,13 @@ std::string dayOf(const HistoryRecord &record) {
   return text;
 }
 
+int secondOf(const HistoryRecord &record) {
+  tm parts = {};
+  if (!parseTime(record.time, parts))
+    return -1;
+  return parts.tm_hour * 3600 + parts.tm_min * 60 + parts.tm_sec;
+}
+
 std::vector<std::time_t> momentsOf(const HistoryRecord &record) {
   std::vector<std::time_t> moments;
   for (const int summer : {0, 1}) {

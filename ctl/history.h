@@ -38,6 +38,9 @@ History parseHistory(std::string_view text);
 /// "YYYY-MM-DD" of a record's time; empty when it has none.
 std::string dayOf(const HistoryRecord &record);
 
+/// Second of the day of a record's time; -1 without one.
+int secondOf(const HistoryRecord &record);
+
 /// The moments that a record's local time may mean: two in the hour that comes twice in autumn, none for a
 /// record without a time.
 std::vector<std::time_t> momentsOf(const HistoryRecord &record);

@@ -9,14 +9,6 @@ namespace {
 
 constexpr int Day = 24 * 3600;
 
-/// Second of the day of a record's time; -1 without one.
-int secondOf(const HistoryRecord &record) {
-  tm parts = {};
-  if (strptime(record.time.c_str(), "%m/%d/%Y %H:%M:%S", &parts) == nullptr)
-    return -1;
-  return parts.tm_hour * 3600 + parts.tm_min * 60 + parts.tm_sec;
-}
-
 bool fits(const HistoryRecord &record, const LogAttempt &attempt, const std::string &user) {
   const PatchFileName name(attempt.patch);
   return record.user == user && record.result == (attempt.passed ? "PASS" : "FAIL") &&

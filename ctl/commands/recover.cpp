@@ -11,6 +11,7 @@
 #include "processes.h"
 #include "recovery/fixing.h"
 #include "recovery/states.h"
+#include "signals.h"
 #include "table.h"
 #include "text.h"
 
@@ -23,8 +24,8 @@ bool isSound(const HomeState &state) {
   return state.fixed || state.state == "nothing-applied" || state.state == "applied";
 }
 
-/// What a state asks for.
-const char *remedyOf(const HomeState &state, bool hasRecord) {
+/// What a state asks for, also after an attempt to fix it.
+const char *remedyOf(const HomeState &state, bool hasRecord, bool isTried) {
   if (state.fixed)
     return "fixed";
   if (isSound(state))
@@ -33,7 +34,7 @@ const char *remedyOf(const HomeState &state, bool hasRecord) {
       state.state == "files-mixed" || state.state == "level-old" || state.state == "history-missing";
   if (isRepetitions)
     return hasRecord ? "undo, or apply again" : "give the same command again";
-  return "recover --fix";
+  return isTried ? "see the messages" : "recover --fix";
 }
 
 Json nullIfEmpty(const Json &text) {
@@ -60,7 +61,7 @@ Json documentOf(const Interruption &found, const std::vector<HomeState> &states)
   return document;
 }
 
-void print(const Interruption &found, const std::vector<HomeState> &states) {
+void print(const Interruption &found, const std::vector<HomeState> &states, bool isTried) {
   if (found.hasRecord)
     printf("transaction %s did not end\n", found.record.id.c_str());
   else if (found.log.isInterrupted && found.log.status)
@@ -71,7 +72,7 @@ void print(const Interruption &found, const std::vector<HomeState> &states) {
     printf("every installation has ended well\n");
   Table table({"STATE", "PATH", "REMEDY"});
   for (const HomeState &state : states)
-    table.add({state.state, terminalText(state.path), remedyOf(state, found.hasRecord)});
+    table.add({state.state, terminalText(state.path), remedyOf(state, found.hasRecord, isTried)});
   table.print();
   for (const std::string &message : found.messages)
     printf("%s\n", terminalText(message).c_str());
@@ -83,12 +84,14 @@ void recover(const std::string &path, bool isToFix, Invocation &invocation) {
   demandNoRun(home.path());
   Interruption found = findInterruption(home);
   std::vector<HomeState> states = tellStates(home, found);
-  if (isToFix)
+  if (isToFix) {
+    outlastInterruptions();
     fixStates(home, found, states, found.messages);
+  }
   if (invocation.output.json)
     printDocument(documentOf(found, states));
   else
-    print(found, states);
+    print(found, states, isToFix);
   const bool isSoundHome = found.isWhole && std::all_of(states.begin(), states.end(), isSound);
   invocation.status = isSoundHome ? Good : Findings;
 }

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <filesystem>
 
 #include <fcntl.h>
 #include <sys/stat.h>
@@ -12,13 +11,13 @@
 #include "child.h"
 #include "filedescriptor.h"
 #include "inputfile.h"
+#include "judgement.h"
+#include "leftover.h"
 #include "transaction/instances.h"
 #include "transaction/plan.h"
 #include "transaction/saving.h"
 
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr std::size_t LargestVersionFile = 1024UL * 1024;
 
@@ -35,10 +34,16 @@ int setAttributes(const std::string &path, const Attributes &attributes) {
   return done ? 0 : errno;
 }
 
-/// Puts a text into an empty file, and on disk.
+/// Puts a text into an empty file, and on disk. Where that fails it is empty again: a part of the text would
+/// hide that something is missing.
 int fill(const std::string &path, const std::string &text) {
   const FileDescriptor file(path.c_str(), O_WRONLY | O_NOFOLLOW);
-  return file.isOpen() && file.write(text) && fsync(file.get()) == 0 ? 0 : errno;
+  if (file.isOpen() && file.write(text) && fsync(file.get()) == 0)
+    return 0;
+  const int error = errno;
+  if (file.isOpen())
+    static_cast<void>(ftruncate(file.get(), 0));
+  return error;
 }
 
 class Fixer {
@@ -50,6 +55,7 @@ public:
   /// more; instances last.
   void fix(std::vector<HomeState> &states) {
     each(states, {"file-missing", "file-twice", "file-attributes"}, &Fixer::fixFile);
+    closeAll(states);
     each(states, {"directory-closed"}, &Fixer::fixDirectory);
     each(states, {"level-empty"}, &Fixer::fixLevel);
     each(states, {"result-file-empty"}, &Fixer::fixResult);
@@ -72,12 +78,17 @@ private:
     return error == 0;
   }
 
+  /// Of several patches with this file the one that still has it under tmp was at work, else the last one.
   bool fixFile(const HomeState &state) {
+    const InterruptedPatch *owner = nullptr;
+    const InterruptedFile *brought = nullptr;
     for (const InterruptedPatch &patch : found_.patches)
       for (const InterruptedFile &file : patch.files)
-        if (file.path == state.path)
-          return fixFile(state, patch, file);
-    return false;
+        if (file.path == state.path && (owner == nullptr || sourceOf(home_, *owner, file.path).empty())) {
+          owner = &patch;
+          brought = &file;
+        }
+    return owner != nullptr && fixFile(state, *owner, *brought);
   }
 
   /// The file gets its owner and mode where it is, in the temporary directory too, before it gets its place.
@@ -111,9 +122,16 @@ private:
     return copied.status == 0 && stateOf(target) ? remove(source) : EIO;
   }
 
+  /// By the record, all of them at once.
+  void closeAll(const std::vector<HomeState> &states) {
+    if (found_.hasRecord && std::any_of(states.begin(), states.end(), [](const HomeState &state) {
+          return state.state == "directory-closed";
+        }))
+      closeDirectories(home_.path(), found_.record, messages_);
+  }
+
   bool fixDirectory(const HomeState &state) {
     if (found_.hasRecord) {
-      closeDirectories(home_.path(), found_.record, messages_);
       const std::optional<FileState> now = stateOf(home_.at(state.path));
       return now && now->mode != 0700;
     }
@@ -128,7 +146,7 @@ private:
         text = InputFile(found_.folder + "/before/" + file.saved).content(LargestVersionFile);
     const auto logged = found_.log.known.find(home_.at(state.path));
     if (text.empty() && logged != found_.log.known.end() && !logged->second.level.empty()) {
-      text = "desc = " + nameOf(state.path) + "\nVRMF = " + logged->second.level + "\n";
+      text = "desc = " + codeOf(state.path) + "\nVRMF = " + logged->second.level + "\n";
       for (const std::string &prereq : logged->second.prereqs)
         text += "preReqALL = " + prereq + "\n";
     }
@@ -140,14 +158,14 @@ private:
   }
 
   /// The product's name is not in the log: its code stands for it.
-  static std::string nameOf(const std::string &versionFile) {
+  static std::string codeOf(const std::string &versionFile) {
     return "k" + versionFile.substr(versionFile.rfind('/') + 1, 2);
   }
 
   bool fixResult(const HomeState &state) { return succeeded(state, fill(home_.at(state.path), "0")); }
 
   bool fixTemporary(const HomeState &state) {
-    const std::string held = onlyCopyIn(state.path);
+    const std::string held = onlyCopy(state.path);
     if (!held.empty()) {
       messages_.push_back(state.path + ": kept, it may hold the only copy of " + held);
       return false;
@@ -161,17 +179,13 @@ private:
 
   /// A file that the home lacks, unless it is known to be one that the patch brings to a new place; empty
   /// when there is none.
-  std::string onlyCopyIn(const std::string &directory) const {
-    const std::string root = home_.at(directory + "/updated_files/");
-    std::error_code error;
-    fs::recursive_directory_iterator entry(root, error);
-    for (const fs::recursive_directory_iterator end; !error && entry != end; entry.increment(error)) {
-      const std::optional<FileState> state = stateOf(entry->path());
-      const std::string path = entry->path().string().substr(root.size());
-      if (state && !S_ISDIR(state->type) && !stateOf(home_.at(path)) && !isKnownAsNew(directory, path))
-        return path;
+  std::string onlyCopy(const std::string &directory) const {
+    try {
+      return onlyCopyIn(home_.path(), directory,
+                        [&](const std::string &path) { return isKnownAsNew(directory, path); });
+    } catch (const JudgementError &) {
+      return "what cannot be read";
     }
-    return error && error != std::errc::no_such_file_or_directory ? "what cannot be read" : "";
   }
 
   bool isKnownAsNew(const std::string &directory, const std::string &path) const {
@@ -212,10 +226,6 @@ private:
   static bool isIn(const std::vector<HomeState> &states, const std::string &name, const std::string &path) {
     return std::any_of(states.begin(), states.end(),
                        [&](const HomeState &state) { return state.state == name && state.path == path; });
-  }
-
-  static std::string nameOf(const RecordedInstance &instance) {
-    return instance.product + (instance.name.empty() ? "" : " " + instance.name);
   }
 
   const Home &home_;

@@ -1,13 +1,11 @@
 #include "recovery/interruption.h"
 
-#include <algorithm>
 #include <filesystem>
 #include <map>
 
 #include <sys/stat.h>
 
 #include "judgement.h"
-#include "logfile.h"
 #include "packages.h"
 #include "text.h"
 #include "transaction/place.h"
@@ -17,8 +15,6 @@
 namespace {
 
 namespace fs = std::filesystem;
-
-constexpr long Day = 24L * 3600;
 
 /// The newest record without an end. That of an undo stands for the installation that it takes back.
 bool findRecord(const Home &home, Interruption &found) {
@@ -53,15 +49,6 @@ std::string copyOf(const std::string &folder, const std::string &file) {
     if (entry.path().filename() == file)
       return entry.path();
   return "";
-}
-
-/// The second of the day that is `time`, the last one before `end`.
-std::time_t lastMoment(int time, std::time_t end) {
-  tm parts = {};
-  if (time < 0 || localtime_r(&end, &parts) == nullptr)
-    return 0;
-  const long passed = parts.tm_hour * 3600L + parts.tm_min * 60L + parts.tm_sec - time;
-  return end - (passed < 0 ? passed + Day : passed);
 }
 
 /// Reads the archive; false, with a message, when it is no patch any more.
@@ -153,13 +140,8 @@ std::string ownerOfInstances(const Home &home, const LogFacts &log) {
 }
 
 void fromLog(const Home &home, Interruption &found) {
-  struct stat status = {};
-  if (stat(logPath(home.path()).c_str(), &status) == 0)
-    found.since = lastMoment(found.log.began, status.st_mtim.tv_sec);
   for (const StoppedInstance &instance : found.log.stopped)
-    if (std::none_of(found.ran.begin(), found.ran.end(), [&instance](const RecordedInstance &known) {
-          return known.product == instance.product && known.name == instance.name;
-        }))
+    if (!isAmong(found.ran, {instance.product, instance.name, "", ""}))
       found.ran.push_back({instance.product, instance.name, "", ownerOfInstances(home, found.log)});
   for (const std::string &directory : found.log.directories) {
     const bool isInside = directory.compare(0, home.path().size(), home.path()) == 0;

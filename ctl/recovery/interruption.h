@@ -37,7 +37,7 @@ struct Interruption {
   std::vector<InterruptedPatch> patches;
   std::vector<RecordedInstance> ran; ///< instances that ran before
   std::vector<std::string> directories;
-  std::time_t since = 0;             ///< lines of the history before this are of others
+  std::time_t since = 0;             ///< with a record: lines of the history before this are of others
   bool isWhole = true;               ///< every patch could be read
   std::vector<std::string> messages; ///< what could not be found out
 

@@ -6,6 +6,8 @@
 
 #include "logfile.h"
 #include "patchfilename.h"
+#include "target.h"
+#include "utilities.h"
 
 namespace {
 
@@ -44,7 +46,9 @@ public:
     else if (step.name == "moveFiles")
       patch.hasBegun = true;
     else if (step.name == "updatePatchVerFile")
-      forget(step.patch);
+      beginLevel(patch);
+    else if (step.name == "updatePatchRegistry")
+      patch.recording = step.time;
   }
 
   void onFileMoved(const std::string &path) override {
@@ -54,9 +58,13 @@ public:
 
   void onStepEnded(const LogStep &step) override {
     steps_.push_back(step);
-    const bool isThrough = step.name == "moveFiles" && step.result == StepResult::Passed;
-    if (isThrough && PatchFileName(step.patch).isValid())
-      patchOf(step.patch).hasMoved = true;
+    if (!PatchFileName(step.patch).isValid())
+      return;
+    PatchFacts &patch = patchOf(step.patch);
+    if (step.name == "moveFiles" && step.result == StepResult::Passed)
+      patch.hasMoved = true;
+    else if (step.name == "updatePatchRegistry" && step.result != StepResult::Open)
+      noteRecorded(patch, step.result == StepResult::Passed);
   }
 
   void onChildEnded(const LogChild &child) override {
@@ -83,8 +91,6 @@ public:
       facts_ = {};
       return;
     }
-    if (!run_.isInterrupted)
-      run_.began = run.time;
     facts_ = std::move(run_);
     facts_.isInterrupted = true;
     facts_.status = run.status;
@@ -98,8 +104,21 @@ private:
                                     [&file](const PatchFacts &patch) { return patch.file == file; });
     if (found != run_.patches.end())
       return *found;
-    run_.patches.push_back({file, "", {}, false, false});
+    run_.patches.emplace_back();
+    run_.patches.back().file = file;
     return run_.patches.back();
+  }
+
+  /// What was recorded of the level before is no record of this one.
+  void beginLevel(PatchFacts &patch) {
+    forget(patch.file);
+    patch.hasRecorded = false;
+    patch.recording = -1;
+  }
+
+  static void noteRecorded(PatchFacts &patch, bool isWritten) {
+    patch.recording = -1;
+    patch.hasRecorded = patch.hasRecorded || isWritten;
   }
 
   /// HOME/bin/QuillAgent [-o one] stop yn, HOME/bin/QuillServer stop ''.
@@ -129,7 +148,8 @@ private:
     } else if (text == "ORVComponentRegistry::buildComponent exit") {
       endVersion();
     } else if (const auto level = behind(text, "Version string provided: ")) {
-      version_.level = level->substr(0, level->find('.'));
+      // "06.10.00. Will pad ff with 00.": the level itself may have points.
+      version_.level = level->substr(0, std::min(level->find(". Will pad"), level->size() - 1));
     } else if (const auto prereq = behind(text, "Added preReqALL value = ")) {
       version_.prereqs.push_back(*prereq);
     }
@@ -146,12 +166,15 @@ private:
   /// The level that was read is no longer the one that a patch has written.
   void forget(const std::string &patch) {
     const PatchFileName name(patch);
+    const Target *const target = findTarget(name.getTarget());
+    const bool isCommandLine = target != nullptr && target->kind == ORVComponent::TYPE_CLI;
     const std::string &product = name.getProduct();
-    const std::string code =
-        name.getTarget() == "vecm" ? "zt" : product.substr(product.size() < 2 ? 0 : product.size() - 2);
+    const std::string code = isCommandLine
+                                 ? target->ownCode
+                                 : Util::toLower(product.substr(product.size() < 2 ? 0 : product.size() - 2));
+    const std::string file = versionFileName(target, code, name.getFullPlatform());
     for (auto version = known_.begin(); version != known_.end();)
-      version = nameOf(version->first).compare(0, code.size(), code) == 0 ? known_.erase(version)
-                                                                          : std::next(version);
+      version = nameOf(version->first) == file ? known_.erase(version) : std::next(version);
   }
 
   LogFacts facts_; ///< of the runs that have ended, in the log's sense

@@ -20,6 +20,8 @@ struct PatchFacts {
   std::set<std::string> moved; ///< relative to the home
   bool hasBegun = false;       ///< a run has come to its files
   bool hasMoved = false;       ///< the last run was through with its files
+  bool hasRecorded = false;    ///< its line of history is written, since its level was written last
+  int recording = -1; ///< the second of the day in which the last run came to that line, when it ended there
 };
 
 struct StoppedInstance {
@@ -37,7 +39,6 @@ struct LogFacts {
   bool isInterrupted = false;                 ///< an installation did not end well
   std::optional<int> status;                  ///< of the last one, when it ended
   std::string user;                           ///< who ran it
-  int began = -1;                             ///< the first one, second of the day
   std::vector<PatchFacts> patches;            ///< in the order in which they were met
   std::vector<LogStep> steps;                 ///< of the last one
   std::set<std::string> replaced;             ///< paths whose old file was removed; absolute

@@ -24,10 +24,6 @@ constexpr std::array<const char *, 13> order = {
     "file-attributes", "directory-closed",  "level-old",     "level-empty",  "result-file-empty",
     "history-missing", "applied",           "temporary-left"};
 
-bool isInstance(const RecordedInstance &a, const RecordedInstance &b) {
-  return a.product == b.product && a.name == b.name;
-}
-
 bool hasAttributes(const FileState &now, const Attributes &wanted) {
   return now.mode == wanted.mode && (wanted.user < 0 || now.user == wanted.user) &&
          (wanted.group < 0 || now.group == wanted.group);
@@ -74,10 +70,9 @@ private:
       return;
     const std::vector<RecordedInstance> running = runningInstances(home_);
     for (const RecordedInstance &instance : found_.ran) {
-      if (std::any_of(running.begin(), running.end(),
-                      [&](const RecordedInstance &now) { return isInstance(now, instance); }))
+      if (isAmong(running, instance))
         continue;
-      add("instances-stopped", instance.product + (instance.name.empty() ? "" : " " + instance.name));
+      add("instances-stopped", nameOf(instance));
       stopped_.insert(instance.product);
     }
   }
@@ -161,23 +156,36 @@ private:
       add("nothing-applied", patch.versionFile);
   }
 
-  /// The patch's own line, written since the installation began.
+  /// The patch's own line, of the installation and not of one before it.
   void tellHistory(const InterruptedPatch &patch) {
     std::string name = patch.patch.descriptor->getPatchName();
     Util::trimString(name);
     std::string result;
-    for (const HistoryRecord &line : readHistory(home_.path()).records) {
-      const std::vector<std::time_t> moments = momentsOf(line);
-      const bool isNew = std::any_of(moments.begin(), moments.end(),
-                                     [this](std::time_t moment) { return moment >= found_.since; });
-      if (isNew && line.product == patch.patch.descriptor->getProductCode() && line.name == name &&
-          line.target == patch.patch.name.getTarget() && line.platform == patch.patch.name.getFullPlatform())
+    for (const HistoryRecord &line : readHistory(home_.path()).records)
+      if (line.product == patch.patch.descriptor->getProductCode() && line.name == name &&
+          line.target == patch.patch.name.getTarget() &&
+          line.platform == patch.patch.name.getFullPlatform() && isOfInstallation(patch, line))
         result = line.result;
-    }
     if (result.empty())
       add("history-missing", "patchlogs/patches.hist");
     else if (result == "PASS")
       add("applied", patch.versionFile);
+  }
+
+  /// By the record's time; else the log tells whether the line was written. The last one is the last run's,
+  /// whenever that was. Of a run that was killed while it wrote, the line has the time of that step.
+  bool isOfInstallation(const InterruptedPatch &patch, const HistoryRecord &line) const {
+    constexpr int Day = 24 * 3600;
+    constexpr int Longest = 60;
+    if (found_.hasRecord) {
+      const std::vector<std::time_t> moments = momentsOf(line);
+      return std::any_of(moments.begin(), moments.end(),
+                         [this](std::time_t moment) { return moment >= found_.since; });
+    }
+    const int second = secondOf(line);
+    const bool isOfStep =
+        patch.facts.recording >= 0 && second >= 0 && (second - patch.facts.recording + Day) % Day <= Longest;
+    return patch.facts.hasRecorded || isOfStep;
   }
 
   bool hasStopped(const InterruptedPatch &patch) const {
@@ -228,12 +236,11 @@ private:
 /// What most regular files of a directory have; the least of them when two are as many.
 Attributes commonAttributes(const fs::path &directory, const std::string &without, Attributes unless) {
   std::map<std::tuple<unsigned, std::int64_t, std::int64_t>, std::size_t> counts;
-  std::error_code error;
-  for (const fs::directory_entry &entry : fs::directory_iterator(directory, error)) {
-    const std::optional<FileState> state = stateOf(entry.path());
-    if (state && S_ISREG(state->type) && entry.path().filename() != without)
+  listDirectory(directory, [&](const std::string &name) {
+    const std::optional<FileState> state = stateOf(directory / name);
+    if (state && S_ISREG(state->type) && name != without)
       ++counts[{state->mode & 0777U, state->user, state->group}];
-  }
+  });
   const auto most = std::max_element(counts.begin(), counts.end(),
                                      [](const auto &a, const auto &b) { return a.second < b.second; });
   if (most == counts.end())

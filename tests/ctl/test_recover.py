@@ -319,3 +319,148 @@ def test_the_terminal_gets_a_table(ctl, ready):
     assert ctl.run("recover", ready).out.decode().splitlines()[1:] == [
         "STATE              PATH                       REMEDY",
         "result-file-empty  vmaorv6/agentdepot/rc.txt  recover --fix"]
+
+
+@pytest.mark.parametrize("level", ["06.10.00.02", "06.10.00", "061000", "06100002"])
+def test_a_level_comes_back_as_it_was_written(ctl, home, program, write, level):
+    home.component("yn", level)
+    assert program.run("-h", home, "-t", write(Patch("yn").file("lib/a", "new\n"))).status == 0
+    home.write("registry/ynlpp266.ver", "")
+    assert unfixed(ctl.document("recover", home, "--fix")) == set()
+    assert home.read("registry/ynlpp266.ver") == f"desc = kyn\nVRMF = {level}\n".encode()
+
+
+@pytest.fixture(name="half_done")
+def half_done_fixture(ready, program, patch_dir):
+    """The first patch of a directory has passed, the second has failed."""
+    ready.component("qa", OLD_LEVEL)
+    Patch("qa", level=NEW_LEVEL, target="vems").file("lib/server", "new\n").write(patch_dir)
+    Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n").script("no.sh", when="post", status=1).write(patch_dir)
+    assert program.run("-h", ready, "-i", patch_dir).status != 0
+    assert [line.result for line in ready.history()] == ["PASS", "FAIL"]
+    return ready
+
+
+def of_server(document):
+    return {state for state, path in told(document) if path in ("registry/qalpp266.ver", "patchlogs/patches.hist")}
+
+
+def test_a_report_on_a_later_day_makes_no_line_of_history_an_old_one(ctl, half_done, program, patch_dir):
+    two_days_ago = time.strftime("%m/%d/%Y", time.localtime(time.time() - 2 * 86400))
+    history = half_done.read("patchlogs/patches.hist").decode()
+    for line in half_done.history():
+        history = history.replace(line.date, f"{two_days_ago} {line.date.split()[1]}")
+    half_done.write("patchlogs/patches.hist", history)
+    assert program.run("-h", half_done, "-t", patch_dir).status == 0
+    assert of_server(ctl.document("recover", half_done, status=1)) == {"applied"}
+
+
+def test_a_line_of_history_that_was_lost_is_missing(ctl, half_done):
+    half_done.write("patchlogs/patches.hist", "")
+    assert of_server(ctl.document("recover", half_done, status=1)) == {"history-missing"}
+
+
+def killed_at(program, home, patch, call, place=None, number=1):
+    """An installation that is killed before the call, for this file of the home where one is named."""
+    injection = ["-e", f"trace={call}", "-e", f"inject={call}:signal=SIGKILL:when={number}"]
+    if place:
+        injection += ["-P", home.path / place]
+    result = program.run("-h", home, "-i", patch, wrapper=["strace", "-o", "/dev/null", *injection])
+    assert result.status == -signal.SIGKILL, result
+
+
+def test_a_line_of_an_earlier_installation_is_not_this_ones(ctl, ready, program, write):
+    path = write(Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n"))
+    assert program.run("-h", ready, "-i", path).status == 0
+    earlier = time.strftime("%m/%d/%Y %H:%M:%S", time.localtime(time.time() - 2 * 3600))
+    history = ready.read("patchlogs/patches.hist").decode()
+    ready.write("patchlogs/patches.hist", history.replace(ready.history()[0].date, earlier))
+    ready.component("yn", OLD_LEVEL)
+    killed_at(program, ready, path, "openat", "patchlogs/patches.hist")
+    assert ready.level("yn") == NEW_LEVEL
+    assert told(ctl.document("recover", ready, status=1)) >= {("history-missing", "patchlogs/patches.hist")}
+
+
+def test_a_run_that_was_killed_behind_its_line_has_it(ctl, ready, program, write):
+    killed_at(program, ready, write(Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n")), "fsync",
+              "patchlogs/patches.hist")
+    assert [line.result for line in ready.history()] == ["PASS"]
+    assert b"updatePatchRegistry() exit" not in ready.read("patchlogs/orvpatch.log")
+    assert told(ctl.document("recover", ready, status=1)) == {
+        ("applied", "registry/ynlpp266.ver"), ("temporary-left", "tmp/kyn")}
+
+
+def test_a_patch_makes_the_level_of_its_own_version_file_alone_unknown(ctl, ready, program, write):
+    ready.component("yn", "05200000", filename="ynvms.ver")
+    assert program.run("-h", ready, "-i", write(Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n"))).status == 0
+    ready.write("registry/ynvms.ver", "")
+    assert unfixed(ctl.document("recover", ready, "--fix")) == set()
+    assert ready.level("yn", filename="ynvms.ver") == "05200000"
+
+
+def test_a_file_of_two_patches_comes_from_the_one_that_was_at_work(ctl, ready, program, patch_dir):
+    ready.component("qa", OLD_LEVEL)
+    Patch("qa", level=NEW_LEVEL, target="vems").file("lib/a", "of the server\n").write(patch_dir)
+    Patch("yn", level=NEW_LEVEL).file("lib/a", "of the agent\n").write(patch_dir)
+    killed_at(program, ready, patch_dir, "link", number=2)
+    assert not ready.exists("lib/a")
+    document = ctl.document("recover", ready, "--fix", status=1)
+    assert {"state": "file-missing", "path": "lib/a", "fixed": True} in document["states"]
+    assert ready.read("lib/a") == b"of the agent\n"
+
+
+def faulty(*options):
+    return ["strace", "-o", "/dev/null", *options]
+
+
+def test_a_version_file_that_cannot_be_put_on_disk_stays_empty(ctl, ready, program, write):
+    assert program.run("-h", ready, "-t", write(Patch("yn").file("lib/a", "new\n"))).status == 0
+    ready.write("registry/ynlpp266.ver", "")
+    document = ctl.document("recover", ready, "--fix", status=1, wrapper=faulty(
+        "-P", ready.path / "registry/ynlpp266.ver", "-e", "inject=fsync:error=EIO"))
+    assert unfixed(document) == {"level-empty"}
+    assert ready.read("registry/ynlpp266.ver") == b""
+    assert ("level-empty", "registry/ynlpp266.ver") in told(ctl.document("recover", ready, status=1))
+
+
+def test_neighbours_that_cannot_be_listed_are_not_taken_for_none(ctl, ready, program, write):
+    ready.write("lib/b", "old\n", 0o710)
+    killed_at(program, ready, write(Patch("yn").file("lib/a", "new\n")), "link")
+    result = ctl.run("recover", ready, "--fix", wrapper=faulty(
+        "-P", ready.path / "lib", "-e", "inject=getdents64:error=EIO"))
+    assert (result.status, ready.exists("lib/a")) == (2, False)
+    assert b"cannot read" in result.err
+    assert ("file-missing", "lib/a") in told(ctl.document("recover", ready, "--fix", status=1))
+    assert mode_of(ready, "lib/a") == 0o710
+
+
+@pytest.mark.parametrize("number", ["SIGINT", "SIGTERM", "SIGHUP"])
+def test_no_interruption_ends_the_fixing(ctl, ready, number):
+    ready.write("vmaorv6/agentdepot/rc.txt", "")
+    document = ctl.document("recover", ready, "--fix", wrapper=["env", "--default-signal", *faulty(
+        "-P", ready.path / "vmaorv6/agentdepot/rc.txt", "-e", f"inject=fsync:signal={number}:when=1")])
+    assert (document["states"], ready.read("vmaorv6/agentdepot/rc.txt")) == (
+        [{"state": "result-file-empty", "path": "vmaorv6/agentdepot/rc.txt", "fixed": True}], b"0")
+
+
+def test_directories_that_cannot_be_opened_are_told_once_each(ctl, bench, scratch):
+    home = bench.scenario.make_home()
+    try:
+        (home.path / "tmp").chmod(0o700)
+        kill_both(ctl, bench, home, kills.example(kills.kills_of(bench), "directory-closed"), scratch)
+        closed = [path for state, path in told(ctl.document("recover", home, status=1)) if state == "directory-closed"]
+        assert len(closed) > 1
+        document = ctl.document("recover", home, "--fix", status=1, wrapper=faulty("-e", "inject=fchmod:error=EIO"))
+        messages = Counter(document["messages"])
+        for path in closed:
+            assert messages[f"{path}: owner and mode cannot be set: Input/output error"] == 1
+        assert "directory-closed" in unfixed(document)
+    finally:
+        home.close()
+
+
+def test_what_could_not_be_fixed_is_not_given_the_same_remedy(ctl, ready):
+    ready.write("registry/ynlpp266.ver", "")
+    assert ctl.run("recover", ready, "--fix").out.decode().splitlines()[2:] == [
+        "level-empty  registry/ynlpp266.ver  see the messages",
+        "registry/ynlpp266.ver: neither record nor log tell what it held"]
