@@ -145,7 +145,7 @@ int start(const std::string &program, const std::vector<std::string> &words,
 /// program elsewhere.
 std::vector<std::string> inDirectory(const std::string &directory, const std::string &program,
                                      const std::vector<std::string> &words) {
-  std::vector<std::string> command = {"sh", "-c", "cd -- \"$0\" && exec \"$@\"", directory, program};
+  std::vector<std::string> command = {"sh", "-c", R"(cd -- "$0" && exec "$@")", directory, program};
   command.insert(command.end(), words.begin() + 1, words.end());
   return command;
 }
@@ -208,7 +208,8 @@ std::string findProgram(const std::string &name, const std::string &path) {
   if (name.find('/') != std::string::npos)
     return access(name.c_str(), X_OK) == 0 ? name : "";
   for (const std::string &directory : Util::tokenizeString(path, ":")) {
-    const std::string program = directory + "/" + name;
+    std::string program = directory;
+    program.append("/").append(name);
     struct stat status = {};
     if (stat(program.c_str(), &status) == 0 && S_ISREG(status.st_mode) && access(program.c_str(), X_OK) == 0)
       return program;

@@ -201,9 +201,11 @@ void saveFiles(const std::string &home, const std::string &folder, Record &recor
 void bringBackSetAside(const std::string &home, const std::string &folder, const Record &record) {
   for (const std::string &directory : record.setAside) {
     const std::string saved = asidePath(folder, directory);
-    if (stateOf(saved) && rename(saved.c_str(), (home + directory).c_str()) != 0)
-      throw JudgementError("cannot put " + home + directory + " back, it is " + saved + ": " +
-                           strerror(errno));
+    std::string place = home;
+    place += directory;
+    if (stateOf(saved) && rename(saved.c_str(), place.c_str()) != 0)
+      throw JudgementError(std::string("cannot put ").append(place).append(" back, it is ").append(saved) +
+                           ": " + strerror(errno));
   }
 }
 
