@@ -39,6 +39,11 @@ set(wrapped_calls
   unlink
   wait
   write)
+# The C library that the packages are built with has other names for the calls that look at a file.
+if(ORVPATCH_SYSROOT)
+  list(REMOVE_ITEM wrapped_calls fstatat lstat stat)
+  list(APPEND wrapped_calls __fxstatat __lxstat __xstat)
+endif()
 list(TRANSFORM wrapped_calls PREPEND "LINKER:--wrap=" OUTPUT_VARIABLE wrap_options)
 
 add_executable(wrapped_tests ${wrapped_tests} ${support} support/systemcalls.cpp)

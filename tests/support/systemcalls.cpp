@@ -131,12 +131,9 @@ int __real_close(int descriptor);
 int __real_fsync(int descriptor);
 off_t __real_lseek(int descriptor, off_t offset, int whence);
 int __real_access(const char *path, int mode);
-int __real_stat(const char *path, struct stat *status);
-int __real_lstat(const char *path, struct stat *status);
 int __real_openat(int directory, const char *path, int flags, ...);
 int __real_fchown(int descriptor, uid_t owner, gid_t group);
 int __real_fchmod(int descriptor, mode_t mode);
-int __real_fstatat(int directory, const char *path, struct stat *status, int flags);
 int __real_ftruncate(int descriptor, off_t length);
 int __real_syncfs(int descriptor);
 int __real_link(const char *source, const char *target);
@@ -231,6 +228,13 @@ int __wrap_access(const char *path, int mode) {
   return fails("access", path) ? -1 : __real_access(path, mode);
 }
 
+// Before glibc 2.33 these three are no functions of the library: a part of every program translates them into
+// calls that name the version of the structure.
+#if __GLIBC_PREREQ(2, 33)
+int __real_stat(const char *path, struct stat *status);
+int __real_lstat(const char *path, struct stat *status);
+int __real_fstatat(int directory, const char *path, struct stat *status, int flags);
+
 int __wrap_stat(const char *path, struct stat *status) {
   return fails("stat", path) ? -1 : __real_stat(path, status);
 }
@@ -238,6 +242,27 @@ int __wrap_stat(const char *path, struct stat *status) {
 int __wrap_lstat(const char *path, struct stat *status) {
   return fails("lstat", path) ? -1 : __real_lstat(path, status);
 }
+
+int __wrap_fstatat(int directory, const char *path, struct stat *status, int flags) {
+  return fails("fstatat", path) ? -1 : __real_fstatat(directory, path, status, flags);
+}
+#else
+int __real___xstat(int version, const char *path, struct stat *status);
+int __real___lxstat(int version, const char *path, struct stat *status);
+int __real___fxstatat(int version, int directory, const char *path, struct stat *status, int flags);
+
+int __wrap___xstat(int version, const char *path, struct stat *status) {
+  return fails("stat", path) ? -1 : __real___xstat(version, path, status);
+}
+
+int __wrap___lxstat(int version, const char *path, struct stat *status) {
+  return fails("lstat", path) ? -1 : __real___lxstat(version, path, status);
+}
+
+int __wrap___fxstatat(int version, int directory, const char *path, struct stat *status, int flags) {
+  return fails("fstatat", path) ? -1 : __real___fxstatat(version, directory, path, status, flags);
+}
+#endif
 
 int __wrap_openat(int directory, const char *path, int flags, ...) {
   va_list arguments;
@@ -249,10 +274,6 @@ int __wrap_openat(int directory, const char *path, int flags, ...) {
 
 int __wrap_fchown(int descriptor, uid_t owner, gid_t group) {
   return fails("fchown") ? -1 : __real_fchown(descriptor, owner, group);
-}
-
-int __wrap_fstatat(int directory, const char *path, struct stat *status, int flags) {
-  return fails("fstatat", path) ? -1 : __real_fstatat(directory, path, status, flags);
 }
 
 int __wrap_fchmod(int descriptor, mode_t mode) {
