@@ -26,9 +26,13 @@ bool contains(std::string_view text, std::string_view piece) {
   return text.find(piece) != std::string_view::npos;
 }
 
-bool isRegularFile(const std::string &path) {
+/// Also when the look at it fails for another reason than its absence: then it counts as one that cannot be
+/// read.
+bool mayBeRegularFile(const std::string &path) {
   struct stat status = {};
-  return stat(path.c_str(), &status) == 0 && S_ISREG(status.st_mode);
+  if (stat(path.c_str(), &status) == 0)
+    return S_ISREG(status.st_mode);
+  return errno != ENOENT && errno != ENOTDIR && errno != ELOOP;
 }
 
 /// Listens to the installer's units, which go on without what they cannot read but say so in their trace.
@@ -71,7 +75,7 @@ private:
     static constexpr std::string_view before = "): Could not read ";
     line.remove_prefix(line.find(before) + before.size());
     const std::string path(line.substr(0, line.rfind(": ")));
-    if (isRegularFile(path))
+    if (mayBeRegularFile(path))
       failure_ = "cannot read " + path;
   }
 
@@ -88,7 +92,7 @@ std::vector<std::string> versionFilesOf(const std::string &registry) {
   const bool exists = listDirectory(registry, [&](const std::string &name) {
     const bool isNamedSo =
         name.size() > end.size() && name.compare(name.size() - end.size(), end.size(), end) == 0;
-    if (isNamedSo && !contains(name, "vpw.ver") && isRegularFile(registry + "/" + name))
+    if (isNamedSo && !contains(name, "vpw.ver") && mayBeRegularFile(registry + "/" + name))
       names.push_back(name);
   });
   if (!exists)
