@@ -71,7 +71,7 @@ TEST(CtlLogReader, ReadsTheFieldsOfAHeader) {
 
 TEST(CtlLogReader, PiecesOfAnySizeGiveTheSame) {
   const std::string text = header() + line("one\n\ntwo\n") + line("three") + header() + line("four");
-  for (const std::size_t piece : {1, 2, 3, 7, 78, 79, 80, 1000}) {
+  for (const std::size_t piece : {1U, 2U, 3U, 7U, 78U, 79U, 80U, 1000U}) {
     Found found;
     read(found, text, piece);
     EXPECT_THAT(found.texts, ElementsAre("one\n\ntwo\n", "three", "four")) << piece;
