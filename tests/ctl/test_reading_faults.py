@@ -42,6 +42,11 @@ COMMANDS = {
 }
 
 
+def findings_of(document):
+    """Without the texts: an owner whose name cannot be looked up is told by number."""
+    return [{key: value for key, value in finding.items() if key != "text"} for finding in document["findings"]]
+
+
 def judge(result, usual, fault):
     """A probe of check that fails is a finding more; whatever else is found stays."""
     assert result.status in (0, 1, 2), result
@@ -54,7 +59,7 @@ def judge(result, usual, fault):
         assert result.status == usual.status
         return
     assert "findings" in document and "report" in document, (document, expected)
-    assert all(finding in document["findings"] for finding in expected["findings"]), (document, expected)
+    assert all(finding in findings_of(document) for finding in findings_of(expected)), (document, expected)
     assert document["errors"] > 0 and result.status == 1
 
 
