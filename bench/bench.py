@@ -57,13 +57,23 @@ def chosen_payloads(chosen):
 
 def conditions(file_system, bench, rounds):
     """The conditions of the measurement, as the first table."""
-    model = next((line.split(":")[1].strip() for line in Path("/proc/cpuinfo").read_text().splitlines()
-                  if line.startswith(("model name", "cpu\t"))), platform.machine())
-    rows = [("date", f"{datetime.date.today()}"), ("processor", f"{os.cpu_count()} x {model}"),
-            ("kernel", f"{platform.system()} {platform.release()}"), ("file system", file_system),
-            ("rounds", rounds),
-            ("load before each run", f"{min(bench.loads):.2f} to {max(bench.loads):.2f}" if bench.loads else "unknown"),
-            *((program, version_of(program)) for program in PROGRAMS)]
+    model = next(
+        (
+            line.split(":")[1].strip()
+            for line in Path("/proc/cpuinfo").read_text().splitlines()
+            if line.startswith(("model name", "cpu\t"))
+        ),
+        platform.machine(),
+    )
+    rows = [
+        ("date", f"{datetime.date.today()}"),
+        ("processor", f"{os.cpu_count()} x {model}"),
+        ("kernel", f"{platform.system()} {platform.release()}"),
+        ("file system", file_system),
+        ("rounds", rounds),
+        ("load before each run", f"{min(bench.loads):.2f} to {max(bench.loads):.2f}" if bench.loads else "unknown"),
+        *((program, version_of(program)) for program in PROGRAMS),
+    ]
     return "".join(f"| {name} | {value} |\n" for name, value in [("", ""), ("---", "---"), *rows])
 
 
@@ -77,19 +87,27 @@ def version_of(program):
 
 def all_tables(first_table, trials):
     growth = [trials[key] for key in GROWTH if key in trials]
-    return "\n".join([first_table,
-                      f"### Goals\n\n{goals_table(trials)}",
-                      *map(trial_table, trials.values()),
-                      f"### System calls\n\n{system_call_table(list(trials.values()))}",
-                      *([f"### Growth\n\n{growth_table(growth)}"] if growth else [])])
+    return "\n".join(
+        [
+            first_table,
+            f"### Goals\n\n{goals_table(trials)}",
+            *map(trial_table, trials.values()),
+            f"### System calls\n\n{system_call_table(list(trials.values()))}",
+            *([f"### Growth\n\n{growth_table(growth)}"] if growth else []),
+        ]
+    )
 
 
 def companion_tables(trials):
     if not trials:
         return ""
     rows = [goal.row() for goal in companion_goals(trials)]
-    return "\n".join([f"### Goals of orvpatchctl\n\n{table(['goal', 'at most', 'found', ''], rows)}",
-                      *map(companion_table, trials.values())])
+    return "\n".join(
+        [
+            f"### Goals of orvpatchctl\n\n{table(['goal', 'at most', 'found', ''], rows)}",
+            *map(companion_table, trials.values()),
+        ]
+    )
 
 
 def write_into_document(tables):
@@ -109,13 +127,18 @@ def main():
         tempfile.tempdir = str(folder)
         bench = Bench(chosen.orvpatch.absolute(), folder, Meter(folder))
         payloads = chosen_payloads(chosen)
-        trials = {payload.key: bench.trial(payload, chosen.rounds, progress)
-                  for payload in payloads if not chosen.companion}
-        companions = {payload.key: bench.companion_trial(payload, chosen.rounds, progress)
-                      for payload in payloads if payload.key in COMPANION}
+        trials = {
+            payload.key: bench.trial(payload, chosen.rounds, progress) for payload in payloads if not chosen.companion
+        }
+        companions = {
+            payload.key: bench.companion_trial(payload, chosen.rounds, progress)
+            for payload in payloads
+            if payload.key in COMPANION
+        }
     first = conditions(file_system, bench, chosen.rounds)
-    tables = "\n".join(filter(None, [first if chosen.companion else all_tables(first, trials),
-                                     companion_tables(companions)]))
+    tables = "\n".join(
+        filter(None, [first if chosen.companion else all_tables(first, trials), companion_tables(companions)])
+    )
     print(tables, end="")
     if chosen.write:
         write_into_document(tables)

@@ -86,15 +86,19 @@ def companion_goals(trials):
     found = []
     if "a" in trials:
         trial = trials["a"]
-        found += [Goal("wall time of apply on (a), of orvpatch -i's", 1.4, trial.ratio(APPLY, TOOL)),
-                  Goal("saving on (a), of orvpatch -i's time", 0.1, trial.saving()),
-                  Goal("wall time of undo on (a), of orvpatch -i's", 1, trial.ratio(UNDO, TOOL)),
-                  Goal("wall time of verify on (a), of orvpatch -i's", 0.5, trial.ratio(VERIFY, TOOL)),
-                  Goal("wall time of lint on (a), of tar -tf's", 2, trial.ratio(LINT, LIST)),
-                  Goal("wall time of lint on (a), of tar -xf's", 2, trial.ratio(LINT, EXTRACT))]
+        found += [
+            Goal("wall time of apply on (a), of orvpatch -i's", 1.4, trial.ratio(APPLY, TOOL)),
+            Goal("saving on (a), of orvpatch -i's time", 0.1, trial.saving()),
+            Goal("wall time of undo on (a), of orvpatch -i's", 1, trial.ratio(UNDO, TOOL)),
+            Goal("wall time of verify on (a), of orvpatch -i's", 0.5, trial.ratio(VERIFY, TOOL)),
+            Goal("wall time of lint on (a), of tar -tf's", 2, trial.ratio(LINT, LIST)),
+            Goal("wall time of lint on (a), of tar -xf's", 2, trial.ratio(LINT, EXTRACT)),
+        ]
         if PEER in trial.costs:
             found.append(Goal("wall time of apply on (a), of dpkg -i's", 1, trial.ratio(APPLY, PEER)))
     if "c" in trials:
-        found += [Goal(f"peak memory of {name} on (c), MiB", 64, trials["c"].peak(name))
-                  for name in (APPLY, UNDO, VERIFY, LINT)]
+        found += [
+            Goal(f"peak memory of {name} on (c), MiB", 64, trials["c"].peak(name))
+            for name in (APPLY, UNDO, VERIFY, LINT)
+        ]
     return found

@@ -84,8 +84,13 @@ def _dpkg(option):
 def _rpm_package(tree, folder):
     top, spec = folder / "rpmbuild", folder / "payload.spec"
     spec.write_text(_SPEC.format(name=f"payload{tree.name}", tree=tree))
-    settings = {"_topdir": top, "_rpmdir": folder, "_rpmfilename": "%{NAME}.rpm", "_binary_payload": "w.ufdio",
-                "__spec_install_post": "%{nil}"}
+    settings = {
+        "_topdir": top,
+        "_rpmdir": folder,
+        "_rpmfilename": "%{NAME}.rpm",
+        "_binary_payload": "w.ufdio",
+        "__spec_install_post": "%{nil}",
+    }
     defines = [word for name, value in settings.items() for word in ("--define", f"{name} {value}")]
     subprocess.run(["rpmbuild", "-bb", "--quiet", *defines, spec], check=True, stderr=subprocess.DEVNULL)
     shutil.rmtree(top)
@@ -104,10 +109,14 @@ def _prepare_rpm(home):
 PEERS = (
     Peer("tar -xf", "tar", _tar_archive, _extract_each),
     Peer("dpkg -i", "dpkg", _deb_package, _dpkg("--no-force-unsafe-io"), _prepare_dpkg, needs_root=True),
-    Peer("dpkg -i --force-unsafe-io", "dpkg", _deb_package, _dpkg("--force-unsafe-io"), _prepare_dpkg,
-         needs_root=True),
-    Peer("rpm -U", "rpm", _rpm_package, lambda home, packages: _rpm(home, "-U", *packages), _prepare_rpm,
-         needs_root=True),
-    Peer("rsync -a", "rsync", _tree_itself,
-         lambda home, trees: ["rsync", "-a", *(f"{tree}/" for tree in trees), f"{home}/"]),
+    Peer("dpkg -i --force-unsafe-io", "dpkg", _deb_package, _dpkg("--force-unsafe-io"), _prepare_dpkg, needs_root=True),
+    Peer(
+        "rpm -U", "rpm", _rpm_package, lambda home, packages: _rpm(home, "-U", *packages), _prepare_rpm, needs_root=True
+    ),
+    Peer(
+        "rsync -a",
+        "rsync",
+        _tree_itself,
+        lambda home, trees: ["rsync", "-a", *(f"{tree}/" for tree in trees), f"{home}/"],
+    ),
 )

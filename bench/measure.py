@@ -11,7 +11,7 @@ class Cost(NamedTuple):
     """What one run used. CPU time and peak memory include the children that the command waited for."""
 
     wall: float  # seconds
-    cpu: float   # seconds, user and system
+    cpu: float  # seconds, user and system
     peak: float  # MiB
 
 
@@ -43,7 +43,8 @@ class Meter:
 
 
 def _succeed(command):
-    done = subprocess.run(command, check=False, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-                          stderr=subprocess.PIPE, cwd="/")
+    done = subprocess.run(
+        command, check=False, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL, stderr=subprocess.PIPE, cwd="/"
+    )
     if done.returncode != 0:
         raise RuntimeError(f"{command} ended with {done.returncode}: {done.stderr.decode(errors='replace')}")

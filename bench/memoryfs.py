@@ -29,8 +29,9 @@ def memory_folder(mebibytes):
 def _mount_image(stack, mebibytes):
     if os.geteuid() != 0:
         raise PermissionError("mounting needs root")
-    memory, folder = (Path(stack.enter_context(tempfile.TemporaryDirectory(prefix="orvpatch-bench-")))
-                      for _ in range(2))
+    memory, folder = (
+        Path(stack.enter_context(tempfile.TemporaryDirectory(prefix="orvpatch-bench-"))) for _ in range(2)
+    )
     _mount(stack, memory, "-t", "tmpfs", "-o", f"size={mebibytes + 64}m", "tmpfs")
     image = memory / "image"
     with image.open("wb") as file:

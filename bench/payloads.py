@@ -8,7 +8,7 @@ from pathlib import Path
 
 from support import Patch, ProductHome
 
-SMALL = (64, 1024)       # bytes of a file, from and to
+SMALL = (64, 1024)  # bytes of a file, from and to
 MIDDLE = (1024, 16384)
 MEBIBYTE = (1 << 20, 1 << 20)
 
@@ -29,8 +29,9 @@ class Payload:
 
     def tiny(self):
         """The same in the smallest shape that still has everything, to test that it runs."""
-        return replace(self, title=f"40 files in the place of: {self.title}", files=40, sizes=SMALL,
-                       patches=min(self.patches, 2))
+        return replace(
+            self, title=f"40 files in the place of: {self.title}", files=40, sizes=SMALL, patches=min(self.patches, 2)
+        )
 
     def codes(self):
         """The product code of each patch; each patch is for another product."""
@@ -38,13 +39,17 @@ class Payload:
 
 
 PAYLOADS = (
-    Payload("a", "10,000 files of 1 to 16 KiB in 500 directories, half of them replacing existing files",
-            10_000, MIDDLE, existing=0.5),
+    Payload(
+        "a",
+        "10,000 files of 1 to 16 KiB in 500 directories, half of them replacing existing files",
+        10_000,
+        MIDDLE,
+        existing=0.5,
+    ),
     Payload("b", "200 files of 1 MiB", 200, MEBIBYTE),
     Payload("c", "50,000 files of 64 to 1,024 bytes", 50_000, SMALL),
     Payload("d", "a directory of 100 patches of 20 files of 1 to 16 KiB", 2_000, MIDDLE, patches=100),
-    Payload("e", "the report on (a): `-t` instead of `-i`", 10_000, MIDDLE, existing=0.5, action="-t",
-            peers=False),
+    Payload("e", "the report on (a): `-t` instead of `-i`", 10_000, MIDDLE, existing=0.5, action="-t", peers=False),
     Payload("s1", "1,000 files, otherwise as (c)", 1_000, SMALL, peers=False),
     Payload("s10", "10,000 files, otherwise as (c)", 10_000, SMALL, peers=False),
 )

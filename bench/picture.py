@@ -12,11 +12,18 @@ from pathlib import Path
 DOCS = Path(__file__).resolve().parents[1] / "docs"
 PAYLOAD = "(a)"
 # The contenders that are shown; True: all files are on disk when it ends.
-SHOWN = {"orvpatch": True, "dpkg -i": True, "dpkg -i --force-unsafe-io": False, "rpm -U": False,
-         "rsync -a": False, "tar -xf": False}
-ROAD = [["choose and check|the patches", "unpack|below tmp", "pre-patch|commands", "stop|the instances",
-         "pre|commands"],
-        ["move|the files", "post|commands", "write|the level", "start|the instances", "OS agent,|history"]]
+SHOWN = {
+    "orvpatch": True,
+    "dpkg -i": True,
+    "dpkg -i --force-unsafe-io": False,
+    "rpm -U": False,
+    "rsync -a": False,
+    "tar -xf": False,
+}
+ROAD = [
+    ["choose and check|the patches", "unpack|below tmp", "pre-patch|commands", "stop|the instances", "pre|commands"],
+    ["move|the files", "post|commands", "write|the level", "start|the instances", "OS agent,|history"],
+]
 
 WIDTH, EDGE = 860, 24
 BOX_WIDTH, BOX_HEIGHT, BOX_STEP = 140, 50, 168
@@ -77,9 +84,16 @@ def road():
     places = [(column, row, words) for row, steps in enumerate(ROAD) for column, words in enumerate(steps)]
     boxes = [part for place in places for part in box(*place)]
     below = FIRST_ROW + len(ROAD) * ROW_STEP - 10
-    return [text(EDGE, 32, "The road of an install", "title"), *boxes,
-            text(EDGE, below, "Once unpacking has begun, the first step that fails leads straight to the last box. "
-                              "Nothing is undone.", "note")], below
+    return [
+        text(EDGE, 32, "The road of an install", "title"),
+        *boxes,
+        text(
+            EDGE,
+            below,
+            "Once unpacking has begun, the first step that fails leads straight to the last box. " "Nothing is undone.",
+            "note",
+        ),
+    ], below
 
 
 def bars(top):
@@ -89,24 +103,35 @@ def bars(top):
     for at, (name, found) in enumerate(seconds.items()):
         y, length = top + 38 + at * BAR_STEP, round(found * scale)
         style = ("own" if name == "orvpatch" else "other") + ("" if SHOWN[name] else " open")
-        parts += [text(BAR_LEFT - 12, y + 14, name, anchor="end"),
-                  f'<rect x="{BAR_LEFT}" y="{y}" width="{length}" height="{BAR_HEIGHT}" rx="2" class="{style}"/>',
-                  text(BAR_LEFT + length + 8, y + 14, f"{found:.2f}")]
+        parts += [
+            text(BAR_LEFT - 12, y + 14, name, anchor="end"),
+            f'<rect x="{BAR_LEFT}" y="{y}" width="{length}" height="{BAR_HEIGHT}" rx="2" class="{style}"/>',
+            text(BAR_LEFT + length + 8, y + 14, f"{found:.2f}"),
+        ]
     below = top + 38 + len(seconds) * BAR_STEP + 18
-    parts.append(text(EDGE, below, "Full bars: all files are on disk at the end. Pale bars: the system writes them later. "
-                                   "Figures and conditions: performance.md", "note"))
+    parts.append(
+        text(
+            EDGE,
+            below,
+            "Full bars: all files are on disk at the end. Pale bars: the system writes them later. "
+            "Figures and conditions: performance.md",
+            "note",
+        )
+    )
     return parts, below
 
 
 def picture():
     first, middle = road()
     second, end = bars(middle + 46)
-    head = (f'<svg xmlns="http://www.w3.org/2000/svg" viewBox="0 0 {WIDTH} {end + EDGE}" width="{WIDTH}" role="img">\n'
-            "<title>The road of an install, and what it costs beside other tools</title>\n"
-            f"<style>{STYLE}</style>\n"
-            '<defs><marker id="tip" markerWidth="7" markerHeight="8" refX="5" refY="4" orient="auto">'
-            '<path d="M0 0 L7 4 L0 8 Z" class="tip"/></marker></defs>\n'
-            f'<rect width="{WIDTH}" height="{end + EDGE}" rx="8" class="page"/>\n')
+    head = (
+        f'<svg xmlns="http://www.w3.org/2000/svg" viewBox="0 0 {WIDTH} {end + EDGE}" width="{WIDTH}" role="img">\n'
+        "<title>The road of an install, and what it costs beside other tools</title>\n"
+        f"<style>{STYLE}</style>\n"
+        '<defs><marker id="tip" markerWidth="7" markerHeight="8" refX="5" refY="4" orient="auto">'
+        '<path d="M0 0 L7 4 L0 8 Z" class="tip"/></marker></defs>\n'
+        f'<rect width="{WIDTH}" height="{end + EDGE}" rx="8" class="page"/>\n'
+    )
     return head + "\n".join(first + second) + "\n</svg>\n"
 
 

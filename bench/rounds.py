@@ -15,9 +15,9 @@ class Trial:
     payload: object
     log_lines: int = 0
     log_bytes: int = 0
-    costs: dict = field(default_factory=dict)         # contender -> its Cost in each round
+    costs: dict = field(default_factory=dict)  # contender -> its Cost in each round
     system_calls: dict = field(default_factory=dict)  # the tool and the floor -> system call -> number
-    absent: dict = field(default_factory=dict)        # peer -> reason for its absence
+    absent: dict = field(default_factory=dict)  # peer -> reason for its absence
 
 
 class Bench:
@@ -66,8 +66,14 @@ class Bench:
 
     def _floor_commands(self, laid, trial):
         # The number and total size of the log lines that the tool has just written.
-        words = [f"{laid.home}/", laid.version_file, trial.payload.files, trial.log_lines, trial.log_bytes,
-                 *laid.patches]
+        words = [
+            f"{laid.home}/",
+            laid.version_file,
+            trial.payload.files,
+            trial.log_lines,
+            trial.log_bytes,
+            *laid.patches,
+        ]
         actions = {FLOOR: "install", FLOOR_AT: "install-at"} if trial.payload.action == "-i" else {FLOOR: "report"}
         return {name: [self._floor, action, *map(str, words)] for name, action in actions.items()}
 

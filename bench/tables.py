@@ -28,9 +28,17 @@ def table(heads, rows):
 
 
 def trial_table(trial):
-    rows = [[name, f"{median(trial, name, 'cpu'):.3f}", f"{ratio(trial, name, FLOOR, 'cpu'):.2f}",
-             f"{median(trial, name, 'wall'):.3f}", f"{ratio(trial, name, TOOL, 'wall'):.2f}",
-             f"{median(trial, name, 'peak'):.1f}"] for name in trial.costs]
+    rows = [
+        [
+            name,
+            f"{median(trial, name, 'cpu'):.3f}",
+            f"{ratio(trial, name, FLOOR, 'cpu'):.2f}",
+            f"{median(trial, name, 'wall'):.3f}",
+            f"{ratio(trial, name, TOOL, 'wall'):.2f}",
+            f"{median(trial, name, 'peak'):.1f}",
+        ]
+        for name in trial.costs
+    ]
     rows += [[name, reason, "", "", "", ""] for name, reason in trial.absent.items()]
     heads = ["", "CPU s", "of the floor's", "wall s", "of orvpatch's", "peak MiB"]
     return f"### ({trial.payload.key}) {trial.payload.title}\n\n{table(heads, rows)}"
@@ -38,18 +46,26 @@ def trial_table(trial):
 
 def system_call_table(trials):
     heads = ["calls for each file", *(f"({trial.payload.key})" for trial in trials)]
-    rows = [[call, *(f"{trial.system_calls[TOOL].get(call, 0) / trial.payload.files:.2f}" for trial in trials)]
-            for call in _SHOWN_CALLS]
-    rows += [[f"**{name}: all**", *(f"{calls_per_file(trial, name):.2f}" for trial in trials)]
-             for name in (TOOL, FLOOR)]
+    rows = [
+        [call, *(f"{trial.system_calls[TOOL].get(call, 0) / trial.payload.files:.2f}" for trial in trials)]
+        for call in _SHOWN_CALLS
+    ]
+    rows += [
+        [f"**{name}: all**", *(f"{calls_per_file(trial, name):.2f}" for trial in trials)] for name in (TOOL, FLOOR)
+    ]
     return table(heads, rows)
 
 
 def growth_table(trials):
     heads = ["files", "CPU µs a file", "floor's", "peak MiB"]
-    rows = [[f"{trial.payload.files:,}", *(f"{median(trial, name, 'cpu') / trial.payload.files * 1e6:.1f}"
-                                           for name in (TOOL, FLOOR)), f"{median(trial, TOOL, 'peak'):.1f}"]
-            for trial in trials]
+    rows = [
+        [
+            f"{trial.payload.files:,}",
+            *(f"{median(trial, name, 'cpu') / trial.payload.files * 1e6:.1f}" for name in (TOOL, FLOOR)),
+            f"{median(trial, TOOL, 'peak'):.1f}",
+        ]
+        for trial in trials
+    ]
     return table(heads, rows)
 
 
@@ -67,13 +83,22 @@ class Goal(NamedTuple):
 
 def goals(trials):
     """The goals for which the trials have a figure; trials by the key of their payload."""
-    found = [Goal(f"CPU, times the floor's, on ({key})", limit, ratio(trials[key], TOOL, FLOOR, "cpu"))
-             for key, limit in zip("abcde", (1.10, 1.05, 1.10, 1.10, 1.10)) if key in trials]
-    found += [Goal(f"own system calls for each file on ({key})", limit, calls_per_file(trials[key], TOOL))
-              for key, limit in (("a", 26), ("d", 60), ("e", 8)) if key in trials]
+    found = [
+        Goal(f"CPU, times the floor's, on ({key})", limit, ratio(trials[key], TOOL, FLOOR, "cpu"))
+        for key, limit in zip("abcde", (1.10, 1.05, 1.10, 1.10, 1.10))
+        if key in trials
+    ]
+    found += [
+        Goal(f"own system calls for each file on ({key})", limit, calls_per_file(trials[key], TOOL))
+        for key, limit in (("a", 26), ("d", 60), ("e", 8))
+        if key in trials
+    ]
     if "a" in trials:
-        found += [Goal(f"wall time on (a), of {name}'s", 0.667, ratio(trials["a"], TOOL, name, "wall"))
-                  for name in trials["a"].costs if name.startswith(("dpkg", "rpm"))]
+        found += [
+            Goal(f"wall time on (a), of {name}'s", 0.667, ratio(trials["a"], TOOL, name, "wall"))
+            for name in trials["a"].costs
+            if name.startswith(("dpkg", "rpm"))
+        ]
     if "c" in trials:
         found.append(Goal("peak memory on (c), MiB", 16, median(trials["c"], TOOL, "peak")))
     if "c" in trials and "s1" in trials:

@@ -19,9 +19,7 @@ def pytest_addoption(parser):
 @pytest.hookimpl(tryfirst=True)  # before they are shuffled: all parts together are the whole
 def pytest_collection_modifyitems(config, items):
     part, parts = map(int, config.getoption("part").split("/"))
-    config.hook.pytest_deselected(
-        items=[item for index, item in enumerate(items) if index % parts != part - 1]
-    )
+    config.hook.pytest_deselected(items=[item for index, item in enumerate(items) if index % parts != part - 1])
     items[:] = items[part - 1 :: parts]
     if os.geteuid() == 0:
         return
@@ -35,9 +33,7 @@ def program():
     """The program under test; says what to do when it has not been built."""
     found = Program()
     if not found.binary.exists():
-        pytest.exit(
-            f"{found.binary} is missing: cmake --preset dev && cmake --build --preset dev", returncode=2
-        )
+        pytest.exit(f"{found.binary} is missing: cmake --preset dev && cmake --build --preset dev", returncode=2)
     return found
 
 

@@ -11,8 +11,7 @@ import pytest
 
 ROOT = Path(__file__).resolve().parents[2]
 PAYLOADS = ["a", "b", "c", "d", "e", "s1", "s10"]
-PEERS = {"tar -xf": "tar", "dpkg -i": "dpkg", "dpkg -i --force-unsafe-io": "dpkg", "rpm -U": "rpm",
-         "rsync -a": "rsync"}
+PEERS = {"tar -xf": "tar", "dpkg -i": "dpkg", "dpkg -i --force-unsafe-io": "dpkg", "rpm -U": "rpm", "rsync -a": "rsync"}
 NEEDS_ROOT = ("dpkg", "rpm")
 
 
@@ -27,7 +26,12 @@ def printed(program, folder):
     """Every table that a run over all payloads prints, by its heading: contender -> the columns behind it."""
     done = subprocess.run(
         [sys.executable, ROOT / "bench/bench.py", "--tiny", "--rounds", "1", "--orvpatch", program.binary],
-        env={**os.environ, "TMPDIR": str(folder)}, capture_output=True, text=True, timeout=300, check=False)
+        env={**os.environ, "TMPDIR": str(folder)},
+        capture_output=True,
+        text=True,
+        timeout=300,
+        check=False,
+    )
     assert done.returncode == 0, done.stderr
     return tables_of(done.stdout)
 
@@ -53,7 +57,7 @@ def test_tool_and_floor_are_measured_on_every_payload(printed, key):
     rows = payload_table(printed, key)
     for contender in ("orvpatch", "floor"):
         assert all(float(column) > 0 for column in rows[contender]), rows[contender]
-    assert rows["floor"][1] == "1.00"     # CPU, of the floor's
+    assert rows["floor"][1] == "1.00"  # CPU, of the floor's
     assert rows["orvpatch"][3] == "1.00"  # wall time, of orvpatch's
 
 

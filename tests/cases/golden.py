@@ -33,11 +33,16 @@ def told(lines):
     ends = [at + 1 for at, line in enumerate(lines) if line[2] == _BUILT]
     if begins:
         blocks = sorted(lines[begin:end] for begin, end in zip(begins, ends))
-        lines[begins[0]:ends[-1]] = [line for block in blocks for line in block]
+        lines[begins[0] : ends[-1]] = [line for block in blocks for line in block]
     return lines
 
 
 def words_of(site, **words):
     """What stands in every log: the program, the home, the search path, the folder of patches."""
-    return {"PROGRAM": site.program.argv[-1], "HOME": site.home.path, "PATH": site.env["PATH"],
-            "FOLDER": site.patch_dir, **words}
+    return {
+        "PROGRAM": site.program.argv[-1],
+        "HOME": site.home.path,
+        "PATH": site.env["PATH"],
+        "FOLDER": site.patch_dir,
+        **words,
+    }

@@ -96,8 +96,9 @@ class Site:
         """Paths under the home that are new ("+ path"), gone ("- path") or different ("* path"), sorted."""
         now, before = self.home.tree(), self._before
         paths = sorted((now.keys() | before.keys()) - set(_BOOKKEEPING))
-        return [f"{_mark(before.get(path), now.get(path))} {path}" for path in paths
-                if before.get(path) != now.get(path)]
+        return [
+            f"{_mark(before.get(path), now.get(path))} {path}" for path in paths if before.get(path) != now.get(path)
+        ]
 
     def log(self):
         """(level, component, message) of every line of the last run."""
@@ -133,9 +134,14 @@ class Running:
         self.home, self.code = site.home, code
         patch = Patch(code, **fields).file(f"bin/{code}").script("a.sh", "pre", body=_WAIT.format(code))
         command = [*site.program.argv, "-h", site.home, "-i", patch.write(site.patch_dir)]
-        self.process = subprocess.Popen(command, env={**os.environ, **site.env}, start_new_session=True,
-                                        stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-                                        preexec_fn=_take_signals)
+        self.process = subprocess.Popen(
+            command,
+            env={**os.environ, **site.env},
+            start_new_session=True,
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.DEVNULL,
+            preexec_fn=_take_signals,
+        )
         limit = time.monotonic() + 30
         while not site.home.exists(f"waiting-{code}"):
             assert time.monotonic() < limit

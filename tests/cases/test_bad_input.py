@@ -13,8 +13,14 @@ LIMIT = 1023  # no text of the catalogue is longer once it is filled
 LONG = "x" * 5000
 
 ODD_PATHS = {
-    "empty": "", "blank": " ", "newline": "a\nb", "percent": "%s%n%d", "not UTF-8": "\udcff\udcfe",
-    "long name": LONG, "long path": "/x" * 3000, "through a device": "/dev/null/x",
+    "empty": "",
+    "blank": " ",
+    "newline": "a\nb",
+    "percent": "%s%n%d",
+    "not UTF-8": "\udcff\udcfe",
+    "long name": LONG,
+    "long path": "/x" * 3000,
+    "through a device": "/dev/null/x",
 }
 
 
@@ -26,17 +32,25 @@ def test_an_odd_path_of_a_patch(site, action, path):
     assert site.changes() == []
 
 
-@pytest.mark.parametrize("path, problem", [
-    ("", "No such file or directory"), ("a\nb", "No such file or directory"), ("%s%n", "No such file or directory"),
-    ("/dev/null/x", "Not a directory"), (LONG, "File name too long"),
-], ids=["empty", "newline", "percent", "device", "long"])
+@pytest.mark.parametrize(
+    "path, problem",
+    [
+        ("", "No such file or directory"),
+        ("a\nb", "No such file or directory"),
+        ("%s%n", "No such file or directory"),
+        ("/dev/null/x", "Not a directory"),
+        (LONG, "File name too long"),
+    ],
+    ids=["empty", "newline", "percent", "device", "long"],
+)
 def test_an_odd_path_of_a_descriptor(site, path, problem):
     expected = site.failed(5, text("ERROR_INIFILE_CANT_READ", path, problem)[:LIMIT])
     assert site.run("-vi", path, "-h", site.home, cwd=site.patch_dir) == expected
 
 
-@pytest.mark.parametrize("path", ["a\nb", "%s%n", "\udcff", LONG, "/dev/null"],
-                         ids=["newline", "percent", "byte", "long", "device"])
+@pytest.mark.parametrize(
+    "path", ["a\nb", "%s%n", "\udcff", LONG, "/dev/null"], ids=["newline", "percent", "byte", "long", "device"]
+)
 def test_an_odd_home(site, path):
     result = site.run("-h", path, "-i", "x", cwd=site.patch_dir)
     assert (result.status, result.out) == (2, b"")
@@ -55,14 +69,23 @@ def test_an_empty_home_is_the_root_directory(site):
 
 def test_a_folder_of_odd_names(site):
     site.home.component("yn")
-    odd = [b"a\nb", b"%s_%n_vema_%d.tar", b"\xff\xfe_lpp266_vema_1.tar", b"___.tar", b"-rf", b"kyn_lpp266_vema_",
-           b"." * 200, b"kyn_lpp266_vema_fp0001_2.tar"]
+    odd = [
+        b"a\nb",
+        b"%s_%n_vema_%d.tar",
+        b"\xff\xfe_lpp266_vema_1.tar",
+        b"___.tar",
+        b"-rf",
+        b"kyn_lpp266_vema_",
+        b"." * 200,
+        b"kyn_lpp266_vema_fp0001_2.tar",
+    ]
     for name in odd:
         (site.patch_dir / os.fsdecode(name)).touch()
     Patch("yn").file("bin/tool").write(site.patch_dir)
     assert site.install(site.patch_dir) == site.done()
-    ignored = [text("DCFPP_NOT_APPLICABLE", f"{site.patch_dir}/{name}")
-               for name in site.listed() if os.fsencode(name) in odd]
+    ignored = [
+        text("DCFPP_NOT_APPLICABLE", f"{site.patch_dir}/{name}") for name in site.listed() if os.fsencode(name) in odd
+    ]
     assert len(ignored) == len(odd)
     assert [line for line in site.logged("INFO") if "will be ignored" in line] == ignored
 

@@ -112,7 +112,9 @@ def test_a_file_name_of_another_product_than_the_descriptors_installs_no_file(si
 @pytest.mark.parametrize("names", NAMES, ids=str)
 def test_or_those_that_an_earlier_patch_left_in_tmp(site, names):
     assert site.install(Patch("yn").file("bin/tool", "first").script("a.sh", "pre", status=1)).status == 21
-    assert site.install(Patch(**names, fixpack="fp0002").file("bin/tool", "second").write(site.patch_dir)) == site.done()
+    assert (
+        site.install(Patch(**names, fixpack="fp0002").file("bin/tool", "second").write(site.patch_dir)) == site.done()
+    )
     assert site.home.read("bin/tool") == b"first"
     assert [line.result for line in site.home.history()] == ["FAIL", "PASS"]
 
@@ -143,8 +145,10 @@ def test_the_archive_is_read_twice(site):
 
 def two_fix_packs(site, **second):
     """Two of one product in a directory; returns those of the older and the newer level."""
-    patches = [Patch("yn", fixpack="fp0001", level="06100001").file("bin/tool", "older"),
-               Patch("yn", fixpack="fp0002", level="06100002", **second).file("bin/tool", "newer")]
+    patches = [
+        Patch("yn", fixpack="fp0001", level="06100001").file("bin/tool", "older"),
+        Patch("yn", fixpack="fp0002", level="06100002", **second).file("bin/tool", "newer"),
+    ]
     site.target(*patches)
     return patches
 
@@ -168,8 +172,9 @@ def test_a_directory_with_a_superseded_patch_is_refused_for_ever(site):
 
 
 def test_a_prerequisite_in_the_same_directory_does_not_count(site):
-    site.target(Patch("ul", level="06100001").file("bin/ul"),
-                Patch("yn", prereqs={"ul": "06.10.00.01"}).file("bin/tool"))
+    site.target(
+        Patch("ul", level="06100001").file("bin/ul"), Patch("yn", prereqs={"ul": "06.10.00.01"}).file("bin/tool")
+    )
     result = site.install(site.patch_dir)
     assert result.status in (10, 32)  # by the order of the listing
     assert site.home.level("ul") == "06100000"

@@ -37,13 +37,16 @@ def clocks(site):
     return list(dict.fromkeys(found))
 
 
-@pytest.mark.parametrize("zone, time, date", [
-    ("UTC0", "13:04:05", "05/06/2039 13:04:05"),
-    ("EAST-9:30", "22:34:05", "05/06/2039 22:34:05"),
-    ("NEXT-11", "00:04:05", "05/07/2039 00:04:05"),
-    ("WEST13", "00:04:05", "05/06/2039 00:04:05"),
-    ("SUMMER5SAVED,J100,J200", "09:04:05", "05/06/2039 09:04:05"),
-])
+@pytest.mark.parametrize(
+    "zone, time, date",
+    [
+        ("UTC0", "13:04:05", "05/06/2039 13:04:05"),
+        ("EAST-9:30", "22:34:05", "05/06/2039 22:34:05"),
+        ("NEXT-11", "00:04:05", "05/07/2039 00:04:05"),
+        ("WEST13", "00:04:05", "05/06/2039 00:04:05"),
+        ("SUMMER5SAVED,J100,J200", "09:04:05", "05/06/2039 09:04:05"),
+    ],
+)
 def test_log_and_history_show_the_local_time_of_any_year(site, clock, zone, time, date):
     clock(BEYOND)
     site.home.component("ox")

@@ -10,31 +10,35 @@ from productsite import SUCCESS, bad_home, usage
 VALID = Patch("ox").descriptor_text()
 
 
-@pytest.mark.parametrize("words", [
-    [],
-    ["-h"],
-    ["--help"],
-    ["-h", "HOME"],
-    ["-h", "HOME", "-i"],                         # no path
-    ["-i", "FILE", "-t", "FILE"],                 # two actions
-    ["-vi", "FILE", "-i", "FILE"],
-    ["-i", "FILE", "-i", "FILE"],
-    ["-h", "HOME", "-h", "HOME"],                 # two homes
-    ["-h", "HOME", "-i", "FILE", "-t"],           # too many words
-    ["-h", "HOME", "-i", "FILE", "-t", "FILE"],
-    ["-h", "HOME", "-x", "FILE"],                 # unknown words
-    ["-h", "HOME", "-I", "FILE"],
-    ["-H", "HOME", "-i", "FILE"],
-    ["-h", "HOME", "-utest", "FILE"],
-    ["-h", "HOME", "", "FILE"],
-    ["HOME", "-h", "-i", "FILE"],
-    ["-h", "HOME", "FILE", "-i"],
-    ["-hHOME", "x", "-i", "FILE"],                # no clustering, no "="
-    ["-h=HOME", "x", "-i", "FILE"],
-    ["-utest", "-h", "HOME"],                     # the self-check's word in another place
-    ["-h", "-utest", "HOME"],
-    ["-h", "HOME", "-utest "],
-], ids=" ".join)
+@pytest.mark.parametrize(
+    "words",
+    [
+        [],
+        ["-h"],
+        ["--help"],
+        ["-h", "HOME"],
+        ["-h", "HOME", "-i"],  # no path
+        ["-i", "FILE", "-t", "FILE"],  # two actions
+        ["-vi", "FILE", "-i", "FILE"],
+        ["-i", "FILE", "-i", "FILE"],
+        ["-h", "HOME", "-h", "HOME"],  # two homes
+        ["-h", "HOME", "-i", "FILE", "-t"],  # too many words
+        ["-h", "HOME", "-i", "FILE", "-t", "FILE"],
+        ["-h", "HOME", "-x", "FILE"],  # unknown words
+        ["-h", "HOME", "-I", "FILE"],
+        ["-H", "HOME", "-i", "FILE"],
+        ["-h", "HOME", "-utest", "FILE"],
+        ["-h", "HOME", "", "FILE"],
+        ["HOME", "-h", "-i", "FILE"],
+        ["-h", "HOME", "FILE", "-i"],
+        ["-hHOME", "x", "-i", "FILE"],  # no clustering, no "="
+        ["-h=HOME", "x", "-i", "FILE"],
+        ["-utest", "-h", "HOME"],  # the self-check's word in another place
+        ["-h", "-utest", "HOME"],
+        ["-h", "HOME", "-utest "],
+    ],
+    ids=" ".join,
+)
 def test_any_other_command_line_prints_the_usage(site, words):
     places = {"HOME": site.home.path, "FILE": site.target(Patch("ox"))}
     assert site.run(*[places.get(word, word) for word in words]) == usage()
@@ -87,7 +91,7 @@ def test_the_home_is_exported_with_one_slash_at_its_end_unless_it_has_one(site, 
     site.home.component("ox")
     target = site.target(Patch("ox").script("go.sh", when="pre"))
     assert site.run("-h", f"{site.home.path}{slash}", "-i", target, env={"QUILLHOME": "/elsewhere/"}).status == 0
-    call, = site.home.journal()
+    (call,) = site.home.journal()
     assert call.quillhome == f"{site.home.path}{slash or '/'}"
 
 
@@ -99,7 +103,8 @@ def test_a_descriptor_is_validated_without_touching_the_home(site):
 def test_a_path_is_shown_as_it_was_given(site):
     site.descriptor(VALID)
     assert site.validate("./../patches/patch.ini", cwd=site.patch_dir) == site.done(
-        "\n./../patches/patch.ini is valid\n\n")
+        "\n./../patches/patch.ini is valid\n\n"
+    )
 
 
 def test_the_verdict_is_logged_as_information(site):
@@ -109,8 +114,7 @@ def test_the_verdict_is_logged_as_information(site):
     folder = f"{site.home.prefix}patchlogs/"
     result = site.validate("absent")
     assert result.out.decode() == f"\n{text('MAIN_NOT_SUCCESSFUL', folder)}\n\n"
-    assert site.log()[-2:] == [
-        ("INFO", "main", text("MAIN_NOT_SUCCESSFUL", folder)), ("TRACE", "main", "main = 5")]
+    assert site.log()[-2:] == [("INFO", "main", text("MAIN_NOT_SUCCESSFUL", folder)), ("TRACE", "main", "main = 5")]
 
 
 @pytest.mark.parametrize("first", ["-h", "x", "-t", ""])
@@ -124,5 +128,6 @@ def test_the_self_check_always_succeeds(site, first):
     argv = [*site.program.argv[-1:], first, site.home.path, "-utest"]
     assert site.log()[:5] == [
         ("TRACE", "main", message)
-        for message in ["main entry", *[f"arg[{at}]: {word}" for at, word in enumerate(argv)]]]
+        for message in ["main entry", *[f"arg[{at}]: {word}" for at, word in enumerate(argv)]]
+    ]
     assert site.log()[-2:] == [("INFO", "main", text("MAIN_SUCCESSFUL")), ("TRACE", "main", "main = 0")]

@@ -21,8 +21,9 @@ _WHOLE_RESULTS = {"done": 0, "usage": 1, "bad_home": 2}  # what these functions 
 def nodes(*kinds):
     for path in sorted(Path(__file__).parent.glob("test_*.py")):
         if path != Path(__file__):
-            yield from (node for node in ast.walk(ast.parse(path.read_text(encoding="utf-8")))
-                        if isinstance(node, kinds))
+            yield from (
+                node for node in ast.walk(ast.parse(path.read_text(encoding="utf-8"))) if isinstance(node, kinds)
+            )
 
 
 def is_key(node):
@@ -36,9 +37,15 @@ def called(call):
 
 def is_message(node):
     """Whether this makes the text of an end: a key, a call of `text` or of a helper that calls it."""
-    return is_key(node) or getattr(node, "id", "") == "message" or any(
-        called(inner) == "text" or called(inner).endswith("_error")
-        for inner in ast.walk(node) if isinstance(inner, ast.Call))
+    return (
+        is_key(node)
+        or getattr(node, "id", "") == "message"
+        or any(
+            called(inner) == "text" or called(inner).endswith("_error")
+            for inner in ast.walk(node)
+            if isinstance(inner, ast.Call)
+        )
+    )
 
 
 def asserted_keys():
@@ -50,8 +57,11 @@ def asserted_statuses():
     found = {_WHOLE_RESULTS[called(call)] for call in nodes(ast.Call) if called(call) in _WHOLE_RESULTS}
     for node in nodes(ast.Call, ast.Tuple):
         values = node.args if isinstance(node, ast.Call) else node.elts
-        found.update(value.value for value, after in zip(values, values[1:])
-                     if isinstance(value, ast.Constant) and type(value.value) is int and is_message(after))
+        found.update(
+            value.value
+            for value, after in zip(values, values[1:])
+            if isinstance(value, ast.Constant) and type(value.value) is int and is_message(after)
+        )
     return found
 
 

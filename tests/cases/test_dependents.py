@@ -18,8 +18,11 @@ def test_only_what_runs_is_stopped(site):
     site.home.start("gl")  # not installed
     assert site.install(Patch("ox", dependents=["yn", "gl", "zz"])) == site.done()
     assert site.home.calls() == ["QuillAgent stop yn", "QuillAgent start yn"]
-    assert {"Dependent product not found: kgl", "Dependent product not found: kzz",
-            "No running instances of kox found"} <= set(site.logged("TRACE"))
+    assert {
+        "Dependent product not found: kgl",
+        "Dependent product not found: kzz",
+        "No running instances of kox found",
+    } <= set(site.logged("TRACE"))
 
 
 def test_dependents_may_be_named_in_any_case_and_length(site):
@@ -29,8 +32,13 @@ def test_dependents_may_be_named_in_any_case_and_length(site):
     assert site.install(Patch("ox", dependents=["KYN", "UL = ignored", "kox"])) == site.done()
     assert site.home.calls() == [
         # in the sorted order of what stands in the descriptor: KYN, UL, kox
-        "QuillAgent stop yn", "QuillAgent stop ul", "QuillAgent stop ox",
-        "QuillAgent start ul", "QuillAgent start yn", "QuillAgent start ox"]
+        "QuillAgent stop yn",
+        "QuillAgent stop ul",
+        "QuillAgent stop ox",
+        "QuillAgent start ul",
+        "QuillAgent start yn",
+        "QuillAgent start ox",
+    ]
 
 
 def test_the_own_product_is_stopped_once(site):
@@ -49,10 +57,11 @@ def test_all_stops_every_agent_in_the_order_of_the_registry(site):
     assert site.install(Patch("ox", dependents=["All"])) == site.done()
     registry = [name[:2] for name in os.listdir(site.home.path / "registry")]
     stops = [f"QuillAgent stop {code}" for code in registry if code in ("ox", "yn", "ul")]
-    assert site.home.calls() == [
-        *stops, "QuillAgent start ul", "QuillAgent start yn", "QuillAgent start ox"]
-    assert {f"Non-stoppable component, will not be added to the list of stopped agents: Sample product {code}"
-            for code in ("pt", "dk", "zt", "qa")} <= set(site.logged("TRACE"))
+    assert site.home.calls() == [*stops, "QuillAgent start ul", "QuillAgent start yn", "QuillAgent start ox"]
+    assert {
+        f"Non-stoppable component, will not be added to the list of stopped agents: Sample product {code}"
+        for code in ("pt", "dk", "zt", "qa")
+    } <= set(site.logged("TRACE"))
 
 
 @pytest.mark.parametrize("dependent", ["wn", "all"])
@@ -63,10 +72,14 @@ def test_the_universal_agent_has_its_own_option_and_inner_instances(site, depend
         site.home.start("wn", name)
     assert site.install(Patch("ox", dependents=[dependent])) == site.done()
     assert site.home.calls() == [
-        "QuillAgent -p a stop wn", "QuillAgent -p z stop wn",
-        "QuillAgent -p a start wn", "QuillAgent -p z start wn"]
+        "QuillAgent -p a stop wn",
+        "QuillAgent -p z stop wn",
+        "QuillAgent -p a start wn",
+        "QuillAgent -p z start wn",
+    ]
     assert {"Found kwn instance of b_kwnsnetd_b, skipping.", "Found kwn instance of kwnstrap_1, skipping."} <= set(
-        site.logged("TRACE"))
+        site.logged("TRACE")
+    )
 
 
 def test_an_instance_of_xe_is_called_without_its_host(site):
@@ -86,7 +99,11 @@ def test_a_server_that_an_agent_patch_names_is_stopped_and_started(site):
     site.home.start("qa", "hub")
     assert site.install(Patch("ox", dependents=["qa"])) == site.done()
     assert site.home.calls() == [
-        "QuillServer stop ''", "QuillServer stop hub", "QuillServer start ''", "QuillServer start hub"]
+        "QuillServer stop ''",
+        "QuillServer stop hub",
+        "QuillServer start ''",
+        "QuillServer start hub",
+    ]
 
 
 def test_a_server_patch_stops_its_dependents(site):
@@ -113,8 +130,7 @@ def test_the_os_agent_is_started_once_as_its_default_instance(site):
     site.home.start("ox", "one")
     site.home.start("ox", "two")
     assert site.install(Patch("ox")) == site.done()
-    assert site.home.calls() == [
-        "QuillAgent -o one stop ox", "QuillAgent -o two stop ox", "QuillAgent start ox"]
+    assert site.home.calls() == ["QuillAgent -o one stop ox", "QuillAgent -o two stop ox", "QuillAgent start ox"]
     assert site.home.read("vmaorv6/agentdepot/rc.txt") == b"0"
 
 
@@ -153,6 +169,7 @@ def test_without_the_depot_the_os_agent_is_started_all_the_same(site):
 
 
 # --- the run information -------------------------------------------------------------------------------
+
 
 def test_only_true_rows_of_this_host_count(site):
     site.home.component("yn")
@@ -200,6 +217,7 @@ def test_another_separator_may_be_declared(site):
 
 # --- scripts that say what they do not do --------------------------------------------------------------
 
+
 def test_a_failed_stop_of_a_process_that_has_gone_counts_as_a_stop(site):
     site.home.component("yn")
     site.home.start("yn")
@@ -207,8 +225,12 @@ def test_a_failed_stop_of_a_process_that_has_gone_counts_as_a_stop(site):
     assert site.install(Patch("yn")) == site.done()
     assert site.home.calls() == ["QuillAgent stop yn", "QuillAgent start yn"]
     assert site.home.instances() == [("yn", "")]
-    assert {"return code: 5", "stdout: o", "stderr: e", "QuillAgent stop failed, but the Process ID is no longer "
-            "active. Assuming agent is now not running"} <= set(site.logged("TRACE"))
+    assert {
+        "return code: 5",
+        "stdout: o",
+        "stderr: e",
+        "QuillAgent stop failed, but the Process ID is no longer " "active. Assuming agent is now not running",
+    } <= set(site.logged("TRACE"))
 
 
 def test_a_start_that_succeeds_is_not_looked_after(site):

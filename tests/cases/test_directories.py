@@ -35,7 +35,8 @@ def test_all_kinds_are_applied_in_their_fixed_order(site):
     assert site.home.calls() == [f"{code}.sh" for code, _ in KINDS]
     assert applied(site) == [(f"k{code}", target, "PASS") for code, target in KINDS]
     assert site.changes() == sorted(
-        ["+ patchlogs/patches.hist", *[f"* registry/{code}lpp266.ver" for code, _ in KINDS]], key=lambda line: line[2:])
+        ["+ patchlogs/patches.hist", *[f"* registry/{code}lpp266.ver" for code, _ in KINDS]], key=lambda line: line[2:]
+    )
 
 
 def test_within_a_kind_the_order_of_the_listing_is_kept(site):
@@ -84,6 +85,7 @@ def test_a_link_to_a_patch_is_a_patch(site):
 
 # --- one of several cannot be loaded -------------------------------------------------------------------
 
+
 def in_listing_order(site, *products):
     """Writes a good patch for each product; returns the products in the order of the listing."""
     for product in products:
@@ -121,8 +123,11 @@ def test_a_running_server_among_several_patches(site):
     path = Patch("qa", target="vems").write(site.patch_dir)
     explanation = f"\n\n{text('ERROR_VEMS_RUNNING', path)}\n"
     only = site.listed()[0] == path.name  # then no patch has been accepted before
-    expected = (site.ended(32, "", f"{explanation}\n{text('ERROR_DCFPP_NO_APPLICABLE', site.patch_dir)}\n\n")
-                if only else site.ended(35, "", f"{explanation}\n\n\n"))
+    expected = (
+        site.ended(32, "", f"{explanation}\n{text('ERROR_DCFPP_NO_APPLICABLE', site.patch_dir)}\n\n")
+        if only
+        else site.ended(35, "", f"{explanation}\n\n\n")
+    )
     assert site.install(site.patch_dir) == expected
 
 
@@ -134,6 +139,7 @@ def test_nothing_is_applied_before_all_are_loaded(site):
 
 
 # --- one of several cannot be applied ------------------------------------------------------------------
+
 
 def test_the_first_that_cannot_be_applied_ends_the_run(site):
     patches = [marked(code, target=target) for code, target in KINDS]
@@ -152,7 +158,8 @@ def test_a_report_that_fails_ends_the_reports(site):
     result = site.report(*patches)
     assert result.status == 0 and result.err == b"\n"
     assert [line for line in result.out.decode().splitlines() if line.startswith("Processing")] == [
-        text("DCFPP_PROCESS_PATCH", site.patch_dir / patch.filename) for patch in patches[:2]]
+        text("DCFPP_PROCESS_PATCH", site.patch_dir / patch.filename) for patch in patches[:2]
+    ]
 
 
 def test_the_registry_is_read_once(site):

@@ -19,8 +19,15 @@ OX, UL, YN, QA = "Linux OS", "UNIX Logs", "Yellow Net", "Monitoring Server"
 RESULT_FILE = "vmaorv6/agentdepot/rc.txt"
 HISTORY_FILE = "patchlogs/patches.hist"
 VERSION_FILE = "registry/ynlpp266.ver"
-LEFT = ["tmp/kyn", "tmp/kyn/1_first.sh", "tmp/kyn/2_stopped.sh", "tmp/kyn/3_moved.sh", "tmp/kyn/patch.ini",
-        "tmp/kyn/updated_files", "tmp/kyn/updated_files/bin"]
+LEFT = [
+    "tmp/kyn",
+    "tmp/kyn/1_first.sh",
+    "tmp/kyn/2_stopped.sh",
+    "tmp/kyn/3_moved.sh",
+    "tmp/kyn/patch.ini",
+    "tmp/kyn/updated_files",
+    "tmp/kyn/updated_files/bin",
+]
 UNMOVED = "tmp/kyn/updated_files/bin/tool"
 
 STOPS = ["QuillAgent stop ox", "QuillAgent stop ul", "QuillAgent stop yn"]
@@ -36,15 +43,15 @@ class Failure(NamedTuple):
     """How one installation fails and what it leaves."""
 
     status: int
-    message: object             # text, or a function of the site that makes it
-    spoil: object               # what is done to site and patch once everything runs
-    calls: list                 # journal of all calls
-    running: str                # codes of what runs afterwards
-    result_file: str = None     # content of rc.txt; None: not written
-    changes: tuple = ()         # beside the temporary directory and the history
-    moved: bool = False         # whether the file of the patch has arrived
-    left: tuple = ()            # in the temporary directory beside the usual
-    ordinary: bool = False      # whether permission bits must count
+    message: object  # text, or a function of the site that makes it
+    spoil: object  # what is done to site and patch once everything runs
+    calls: list  # journal of all calls
+    running: str  # codes of what runs afterwards
+    result_file: str = None  # content of rc.txt; None: not written
+    changes: tuple = ()  # beside the temporary directory and the history
+    moved: bool = False  # whether the file of the patch has arrived
+    left: tuple = ()  # in the temporary directory beside the usual
+    ordinary: bool = False  # whether permission bits must count
 
 
 def archive_is_damaged(site, patch):
@@ -81,53 +88,119 @@ def version_file_is_read_only(site, patch):
 
 SCRIPTS = ["1_first.sh", "2_stopped.sh", "3_moved.sh"]
 FAILURES = {
-    "1, extraction": Failure(
-        3, text("PROC_BAD_RC", "tar -xf", 9), archive_is_damaged, calls=[], running="ox ul yn"),
+    "1, extraction": Failure(3, text("PROC_BAD_RC", "tar -xf", 9), archive_is_damaged, calls=[], running="ox ul yn"),
     "2, pre-patch commands": Failure(
-        22, text("PROC_BAD_RC", "1_first.sh", 3), script("1_first.sh", "pre_patch", status=3, out="o", err="e"),
-        calls=SCRIPTS[:1], running="ox ul yn"),
+        22,
+        text("PROC_BAD_RC", "1_first.sh", 3),
+        script("1_first.sh", "pre_patch", status=3, out="o", err="e"),
+        calls=SCRIPTS[:1],
+        running="ox ul yn",
+    ),
     "3, stop of the first": Failure(
-        14, stop_error(OX), switch("stop", "ox"), calls=[SCRIPTS[0], *STOPS[:1]], running="ox ul yn"),
+        14, stop_error(OX), switch("stop", "ox"), calls=[SCRIPTS[0], *STOPS[:1]], running="ox ul yn"
+    ),
     "3, stop of the second": Failure(
-        14, stop_error(UL), switch("stop", "ul"), calls=[SCRIPTS[0], *STOPS[:2], *OS_AGENT], running="ox ul yn",
-        result_file="14"),
+        14,
+        stop_error(UL),
+        switch("stop", "ul"),
+        calls=[SCRIPTS[0], *STOPS[:2], *OS_AGENT],
+        running="ox ul yn",
+        result_file="14",
+    ),
     "3, stop of the last": Failure(
-        14, stop_error(YN), switch("stop", "yn"), calls=[SCRIPTS[0], *STOPS, *OS_AGENT], running="ox yn",
-        result_file="14"),
+        14,
+        stop_error(YN),
+        switch("stop", "yn"),
+        calls=[SCRIPTS[0], *STOPS, *OS_AGENT],
+        running="ox yn",
+        result_file="14",
+    ),
     "4, pre commands": Failure(
-        21, text("PROC_BAD_RC", "2_stopped.sh", 255), script("2_stopped.sh", "pre", status=255),
-        calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT], running="ox", result_file="21"),
+        21,
+        text("PROC_BAD_RC", "2_stopped.sh", 255),
+        script("2_stopped.sh", "pre", status=255),
+        calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT],
+        running="ox",
+        result_file="21",
+    ),
     "5, a file that cannot be moved": Failure(
-        25, lambda site: text("ERROR_PP_MOVE_FILE", f"{site.home.prefix}tmp/kyn/updated_files/./bin/tool",
-                              f"{site.home.prefix}./bin/tool"),
-        target_is_a_directory, calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT], running="ox", result_file="25"),
+        25,
+        lambda site: text(
+            "ERROR_PP_MOVE_FILE", f"{site.home.prefix}tmp/kyn/updated_files/./bin/tool", f"{site.home.prefix}./bin/tool"
+        ),
+        target_is_a_directory,
+        calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT],
+        running="ox",
+        result_file="25",
+    ),
     "5, a directory that cannot be made": Failure(
-        26, lambda site: text("ERROR_PP_MAKE_DIR", f"{site.home.prefix}./bin/new/"),
-        directory_is_a_dangling_link, calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT], running="ox",
-        result_file="26", left=("tmp/kyn/updated_files/bin/new", "tmp/kyn/updated_files/bin/new/file")),
+        26,
+        lambda site: text("ERROR_PP_MAKE_DIR", f"{site.home.prefix}./bin/new/"),
+        directory_is_a_dangling_link,
+        calls=[SCRIPTS[0], *STOPS, SCRIPTS[1], *OS_AGENT],
+        running="ox",
+        result_file="26",
+        left=("tmp/kyn/updated_files/bin/new", "tmp/kyn/updated_files/bin/new/file"),
+    ),
     "7, post commands": Failure(
-        23, text("PROC_BAD_RC", "3_moved.sh", 1), script("3_moved.sh", "post", status=1),
-        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT], running="ox", result_file="23", moved=True),
+        23,
+        text("PROC_BAD_RC", "3_moved.sh", 1),
+        script("3_moved.sh", "post", status=1),
+        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT],
+        running="ox",
+        result_file="23",
+        moved=True,
+    ),
     "8, version file that cannot be read": Failure(
-        28, lambda site: text("ERROR_PP_UPDATE_VRMF", f"{site.home.prefix}{VERSION_FILE}", "2"),
-        version_file_is_removed, calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT], running="ox",
-        result_file="28", moved=True, changes=(f"- {VERSION_FILE}",)),
+        28,
+        lambda site: text("ERROR_PP_UPDATE_VRMF", f"{site.home.prefix}{VERSION_FILE}", "2"),
+        version_file_is_removed,
+        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT],
+        running="ox",
+        result_file="28",
+        moved=True,
+        changes=(f"- {VERSION_FILE}",),
+    ),
     "8, version file that cannot be written": Failure(
-        28, lambda site: text("ERROR_PP_UPDATE_VRMF", f"{site.home.prefix}{VERSION_FILE}", "Permission denied"),
-        version_file_is_read_only, calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT], running="ox",
-        result_file="28", moved=True, ordinary=True),
+        28,
+        lambda site: text("ERROR_PP_UPDATE_VRMF", f"{site.home.prefix}{VERSION_FILE}", "Permission denied"),
+        version_file_is_read_only,
+        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *OS_AGENT],
+        running="ox",
+        result_file="28",
+        moved=True,
+        ordinary=True,
+    ),
     "9, start of the first": Failure(
-        12, text("ERROR_START_AGENT", UL), switch("start", "ul"),
-        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *STARTS[:1], *OS_AGENT], running="ox",
-        result_file="12", moved=True, changes=(f"* {VERSION_FILE}",)),
+        12,
+        text("ERROR_START_AGENT", UL),
+        switch("start", "ul"),
+        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *STARTS[:1], *OS_AGENT],
+        running="ox",
+        result_file="12",
+        moved=True,
+        changes=(f"* {VERSION_FILE}",),
+    ),
     "9, start of the last": Failure(
-        12, text("ERROR_START_AGENT", YN), switch("start", "yn"),
-        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *STARTS, *OS_AGENT], running="ox ul",
-        result_file="12", moved=True, changes=(f"* {VERSION_FILE}",)),
+        12,
+        text("ERROR_START_AGENT", YN),
+        switch("start", "yn"),
+        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *STARTS, *OS_AGENT],
+        running="ox ul",
+        result_file="12",
+        moved=True,
+        changes=(f"* {VERSION_FILE}",),
+    ),
     "10, start of the OS agent alone": Failure(
-        12, text("ERROR_START_AGENT", OX), switch("start", "ox"),
-        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *STARTS, *OS_AGENT], running="ul yn",
-        result_file="0", moved=True, changes=(f"* {VERSION_FILE}",)),
+        12,
+        text("ERROR_START_AGENT", OX),
+        switch("start", "ox"),
+        calls=[SCRIPTS[0], *STOPS, *SCRIPTS[1:], *STARTS, *OS_AGENT],
+        running="ul yn",
+        result_file="0",
+        moved=True,
+        changes=(f"* {VERSION_FILE}",),
+    ),
 }
 
 
@@ -139,8 +212,13 @@ def site(site):
 
 
 def patch_of_yn(dependents=("ul", "ox")):
-    return (Patch("yn", dependents=dependents).file("bin/tool").script("1_first.sh", "pre_patch")
-            .script("2_stopped.sh", "pre").script("3_moved.sh", "post"))
+    return (
+        Patch("yn", dependents=dependents)
+        .file("bin/tool")
+        .script("1_first.sh", "pre_patch")
+        .script("2_stopped.sh", "pre")
+        .script("3_moved.sh", "post")
+    )
 
 
 @pytest.mark.parametrize("failure", FAILURES.values(), ids=FAILURES)
@@ -197,9 +275,17 @@ def test_files_before_the_failing_one_stay_moved(site):
     site.home.mkdir("tool")
     assert site.install(Patch("yn").file("a/b/new").file("tool")).status == 25
     assert site.changes() == [
-        "+ a", "+ a/b", "+ a/b/new", f"+ {HISTORY_FILE}", "+ tmp/kyn", "+ tmp/kyn/patch.ini",
-        "+ tmp/kyn/updated_files", "+ tmp/kyn/updated_files/a", "+ tmp/kyn/updated_files/a/b",
-        "+ tmp/kyn/updated_files/tool"]
+        "+ a",
+        "+ a/b",
+        "+ a/b/new",
+        f"+ {HISTORY_FILE}",
+        "+ tmp/kyn",
+        "+ tmp/kyn/patch.ini",
+        "+ tmp/kyn/updated_files",
+        "+ tmp/kyn/updated_files/a",
+        "+ tmp/kyn/updated_files/a/b",
+        "+ tmp/kyn/updated_files/tool",
+    ]
 
 
 def test_files_are_never_copied_to_another_file_system(site):
@@ -248,8 +334,11 @@ def test_a_command_that_is_not_there(site, when, status):
     patch = Patch("yn").command(when, "absent.sh --word")
     assert site.install(patch) == site.failed(status, text("PROC_BAD_RC", "absent.sh --word", 2))
     assert site.logged("ERROR") == [
-        "error calling execvp = 2: No such file or directory", text("PROC_BAD_RC", "absent.sh --word", 2),
-        "stdOut: ", "stdErr: "]
+        "error calling execvp = 2: No such file or directory",
+        text("PROC_BAD_RC", "absent.sh --word", 2),
+        "stdOut: ",
+        "stdErr: ",
+    ]
 
 
 @pytest.mark.parametrize("when, status", COMMANDS.items())
@@ -294,10 +383,12 @@ def test_after_a_failed_command_path_and_directory_are_the_old_ones(site):
     patch = Patch("yn", dependents=["ox"]).script("go.sh", "pre", status=1)
     site.install(patch, cwd="/usr", env={"PATH": "/usr/bin:/bin"})
     assert [(str(call), call.cwd, call.path) for call in site.home.journal()[-1:]] == [
-        ("QuillAgent start ox", "/usr", "/usr/bin:/bin")]
+        ("QuillAgent start ox", "/usr", "/usr/bin:/bin")
+    ]
 
 
 # --- control scripts -----------------------------------------------------------------------------------
+
 
 def instance_error(key, name, product):
     return text(key, name, product) if "START" in key else text(key, name, product, product)
@@ -310,8 +401,7 @@ CONTROL = {  # what runs, the verb that fails, the problem
     "start of Primary": ("yn", "Primary", "start", 12, text("ERROR_START_AGENT", YN)),
     "stop of the server": ("qa", "", "stop", 18, text("ERROR_STOP_SERVER", QA, QA)),
     "stop of a server instance": ("qa", "hub", "stop", 19, instance_error("ERROR_STOP_SRV_INST", "hub", QA)),
-    "stop of the server's Primary": (
-        "qa", "Primary", "stop", 19, instance_error("ERROR_STOP_SRV_INST", "Primary", QA)),
+    "stop of the server's Primary": ("qa", "Primary", "stop", 19, instance_error("ERROR_STOP_SRV_INST", "Primary", QA)),
     "start of the server": ("qa", "", "start", 16, text("ERROR_START_SERVER", QA)),
     "start of a server instance": ("qa", "hub", "start", 19, instance_error("ERROR_START_SRV_INST", "hub", QA)),
 }
@@ -362,6 +452,7 @@ def test_all_ends_with_the_first_failed_stop(site):
 
 # --- clean-up ------------------------------------------------------------------------------------------
 
+
 @pytest.fixture
 def elsewhere(site):
     """The temporary directory is a link: everything works in it, but it cannot be removed as a directory."""
@@ -377,8 +468,8 @@ def test_a_failed_clean_up_does_not_fail_the_installation(site, elsewhere):
     site.home.start("ox")
     message = text("ERROR_PP_RM_DIR", f"{site.home.prefix}tmp/kyn")
     assert site.install(patch_of_yn(["ox"])) == site.done()
-    assert site.logged("ERROR") == [message]           # before; then the link itself is removed
-    assert site.home.read(RESULT_FILE) == b"27"        # but its code is what the OS agent is told
+    assert site.logged("ERROR") == [message]  # before; then the link itself is removed
+    assert site.home.read(RESULT_FILE) == b"27"  # but its code is what the OS agent is told
     assert (elsewhere / "kept").exists()
 
 

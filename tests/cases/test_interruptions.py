@@ -23,9 +23,15 @@ def patch_of(version):
 
 
 def start(site, archive):
-    return subprocess.Popen([*site.program.argv, "-h", site.home, "-i", archive], stdin=subprocess.DEVNULL,
-                            stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL, cwd="/", start_new_session=True,
-                            preexec_fn=lambda: [signal.signal(number, signal.SIG_DFL) for number in ENDING])
+    return subprocess.Popen(
+        [*site.program.argv, "-h", site.home, "-i", archive],
+        stdin=subprocess.DEVNULL,
+        stdout=subprocess.DEVNULL,
+        stderr=subprocess.DEVNULL,
+        cwd="/",
+        start_new_session=True,
+        preexec_fn=lambda: [signal.signal(number, signal.SIG_DFL) for number in ENDING],
+    )
 
 
 def end(running):

@@ -18,7 +18,8 @@ VALID = DESCRIPTOR
 RULE = "=" * 78
 HEADER = re.compile(
     rf"{RULE}\n ORV Patch Log File\n   System Name: (.*)\n   User Name:   (.*)\n   Process ID:  (\d+)\n"
-    rf"   Build Date:  ([1-9]\d?/[1-9]\d?/\d\d \d\d:\d\d:\d\d)\n{RULE}\n")
+    rf"   Build Date:  ([1-9]\d?/[1-9]\d?/\d\d \d\d:\d\d:\d\d)\n{RULE}\n"
+)
 PREFIX = re.compile(r"^(ERROR|INFO |TRACE) \d\d:\d\d:\d\d \(([^,]+),\d+\): ", re.MULTILINE)
 SHORT_LEVEL = {"ERROR": "ERROR", "INFO": "INFO ", "TRACE": "TRACE"}
 
@@ -42,7 +43,7 @@ def test_a_run_writes_a_header_and_its_lines(site):
     logged = site.home.read("patchlogs/orvpatch.log").decode()
     header = HEADER.match(logged)
     assert header.groups()[:2] == (os.uname().nodename.split(".")[0], pwd.getpwuid(os.getuid()).pw_name)
-    assert without_times(logged[header.end():]) == as_printed(validation_lines(site, path))
+    assert without_times(logged[header.end() :]) == as_printed(validation_lines(site, path))
 
 
 def test_the_header_names_the_process_of_the_run(site):
@@ -70,7 +71,8 @@ def test_lines_of_runs_side_by_side_stay_whole(site):
     assert {result.result().status for result in results} == {0}
     logged = HEADER.sub("", site.home.read("patchlogs/orvpatch.log").decode())
     assert sorted(without_times(logged).splitlines()) == sorted(
-        as_printed(validation_lines(site, path)).splitlines() * 6)
+        as_printed(validation_lines(site, path)).splitlines() * 6
+    )
 
 
 def test_a_missing_folder_is_made(site):
@@ -88,7 +90,7 @@ def test_patch_debug_sends_everything_to_standard_output(site, value):
     header = HEADER.match(result.out.decode())
     *lines, verdict, end = validation_lines(site, path)
     expected = as_printed(lines) + f"\n{path} is valid\n\n" + as_printed([verdict]) + SUCCESS + as_printed([end])
-    assert without_times(result.out[header.end():].decode()) == expected
+    assert without_times(result.out[header.end() :].decode()) == expected
     assert (result.status, result.err) == (0, b"")
     assert site.changes() == []
 
@@ -106,14 +108,16 @@ def test_a_patch_is_applied_under_patch_debug_but_not_recorded_without_the_folde
 def test_under_patch_debug_the_report_stands_among_the_lines_of_its_steps(site):
     site.home.component("ox")
     result = site.report(Patch("ox").file("bin/tool"), env={"PATCH_DEBUG": ""})
-    steps = ["TRACE (dcfpackageprocessor): DCFPackageProcessor::testRun() entry\n",
-             "TRACE (patchprocessor): PatchProcessor::cleanUp() = 1\n",
-             f"\n{'=' * 70}\n",
-             "TRACE (patchprocessor): PatchProcessor::testRun() entry\n",
-             "TRACE (patchprocessor): PatchProcessor::listFiles() entry\n",
-             "/bin/tool",
-             "\n\nTRACE (patchprocessor): PatchProcessor::listFiles() exit\n",
-             "TRACE (patchprocessor): PatchProcessor::testRun() = 1\n"]
+    steps = [
+        "TRACE (dcfpackageprocessor): DCFPackageProcessor::testRun() entry\n",
+        "TRACE (patchprocessor): PatchProcessor::cleanUp() = 1\n",
+        f"\n{'=' * 70}\n",
+        "TRACE (patchprocessor): PatchProcessor::testRun() entry\n",
+        "TRACE (patchprocessor): PatchProcessor::listFiles() entry\n",
+        "/bin/tool",
+        "\n\nTRACE (patchprocessor): PatchProcessor::listFiles() exit\n",
+        "TRACE (patchprocessor): PatchProcessor::testRun() = 1\n",
+    ]
     _, begin, rest = without_times(result.out.decode()).partition(steps[0])
     assert begin
     for step in steps[1:]:

@@ -5,8 +5,11 @@ from support import Patch
 from golden import golden, told, words_of
 
 # Short codes and an OS agent's descriptor with all that it may have.
-DESCRIPTOR = Patch("ox", exe="x", prereqs={"gl": "061000"}, dependents=["ul", "kyn"],
-                   post=["a"]).descriptor_text().replace("= kox", "= OX", 1)
+DESCRIPTOR = (
+    Patch("ox", exe="x", prereqs={"gl": "061000"}, dependents=["ul", "kyn"], post=["a"])
+    .descriptor_text()
+    .replace("= kox", "= OX", 1)
+)
 
 
 def expect(site, name, result, status, **words):
@@ -29,9 +32,14 @@ def test_an_installation(site):
     home.start("yn", "north")
     home.write("bin/tool", "old")
     pids = {"PID ox": home.pid("ox"), "PID yn north": home.pid("yn", "north")}
-    patch = (Patch("yn", prereqs={"kox": "06.10.00", "kyn": "06100000"}, dependents=["kox", "kzz"])
-             .file("bin/tool").script("1.sh", "pre_patch", out="one").script("2.sh", "pre")
-             .script("3a.sh", "post", err="three").script("3b.sh", "post"))
+    patch = (
+        Patch("yn", prereqs={"kox": "06.10.00", "kyn": "06100000"}, dependents=["kox", "kzz"])
+        .file("bin/tool")
+        .script("1.sh", "pre_patch", out="one")
+        .script("2.sh", "pre")
+        .script("3a.sh", "post", err="three")
+        .script("3b.sh", "post")
+    )
     expect(site, "installation", site.install(patch), 0, **pids)
 
 

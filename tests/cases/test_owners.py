@@ -25,12 +25,13 @@ def test_root_starts_an_agent_as_its_owner(site, other_owner):
     patch = Patch("yn", dependents=["ox"])
     assert site.install(patch, wrapper=other_owner.wrapper) == site.done()
     assert [(str(call), call.user) for call in site.home.journal()] == [
-        ("QuillAgent stop ox", "root"),              # a stop never switches
+        ("QuillAgent stop ox", "root"),  # a stop never switches
         ("QuillAgent -o north stop yn", "root"),
         ("QuillAgent -o south stop yn", "root"),
         ("QuillAgent -o north start yn", other_owner.name),
         ("QuillAgent -o south start yn", "root"),
-        ("QuillAgent start ox", other_owner.name)]
+        ("QuillAgent start ox", other_owner.name),
+    ]
     started = site.home.journal()[3]
     assert (started.cwd, started.quillhome) == ("/", "")  # a login of that user, not this environment
     assert os.stat(f"/proc/{site.home.pid('yn', 'north')}").st_uid == other_owner.uid
@@ -42,7 +43,9 @@ def test_root_starts_an_agent_as_its_owner_each_time(site, other_owner):
     patches = [Patch("yn", fixpack="fp0001"), Patch("yn", fixpack="fp0002")]
     assert site.install(*patches, wrapper=other_owner.wrapper) == site.done()
     assert [(str(call), call.user) for call in site.home.journal()] == 2 * [
-        ("QuillAgent -o north stop yn", "root"), ("QuillAgent -o north start yn", other_owner.name)]
+        ("QuillAgent -o north stop yn", "root"),
+        ("QuillAgent -o north start yn", other_owner.name),
+    ]
 
 
 @pytest.mark.needs_root
@@ -52,8 +55,12 @@ def test_the_command_goes_through_su(site, other_owner):
     commands = [message for message in site.logged("TRACE") if message.startswith("cmdArray")]
     start = f"{site.home.prefix}bin/QuillAgent -o north start yn"
     assert commands[-5:] == [
-        "cmdArray[0]: /bin/su", "cmdArray[1]: -", f"cmdArray[2]: {other_owner.name}", "cmdArray[3]: -c",
-        f"cmdArray[4]: {start}"]
+        "cmdArray[0]: /bin/su",
+        "cmdArray[1]: -",
+        f"cmdArray[2]: {other_owner.name}",
+        "cmdArray[3]: -c",
+        f"cmdArray[4]: {start}",
+    ]
 
 
 @pytest.mark.needs_root
@@ -68,7 +75,9 @@ def test_a_server_is_started_as_the_current_user(site, other_owner):
     site.home.start("qa", user=other_owner.uid)
     assert site.install(Patch("yn", dependents=["qa"]), wrapper=other_owner.wrapper) == site.done()
     assert [(str(call), call.user) for call in site.home.journal()] == [
-        ("QuillServer stop ''", "root"), ("QuillServer start ''", "root")]
+        ("QuillServer stop ''", "root"),
+        ("QuillServer start ''", "root"),
+    ]
 
 
 FOREIGN = 1  # the process id of the first process, which belongs to root
@@ -92,9 +101,10 @@ def test_others_cannot_start_an_agent_of_another_user(ordinary):
     assert ordinary.home.level("yn") == "06100100" and ordinary.home.exists("bin/tool")
     log = ordinary.log()
     begin = log.index(("TRACE", "orvcomponent", "startInstance() entry"))
-    assert log[begin + 1:begin + 3] == [
+    assert log[begin + 1 : begin + 3] == [
         ("ERROR", "orvcomponent", text("ERROR_START_CANT_SU", "root")),
-        ("TRACE", "orvcomponent", "startInstance() exit")]
+        ("TRACE", "orvcomponent", "startInstance() exit"),
+    ]
 
 
 @pytest.mark.needs_root

@@ -66,10 +66,16 @@ def test_the_child_that_a_run_waits_for_is_shown(site):
 
 
 def test_the_child_that_fills_a_pipe_is_shown_in_pipe_write(site):
-    site.env["PATH"] = stubs(site.patch_dir.parent / "stubs", tar='exec tail -c 40000000 /dev/zero')
+    site.env["PATH"] = stubs(site.patch_dir.parent / "stubs", tar="exec tail -c 40000000 /dev/zero")
     words = [*site.program.argv, "-h", site.home, "-i", Patch("yn").write(site.patch_dir)]
-    run = subprocess.Popen(words, env={**os.environ, **site.env}, start_new_session=True, stdin=subprocess.DEVNULL,
-                           stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)
+    run = subprocess.Popen(
+        words,
+        env={**os.environ, **site.env},
+        start_new_session=True,
+        stdin=subprocess.DEVNULL,
+        stdout=subprocess.DEVNULL,
+        stderr=subprocess.DEVNULL,
+    )
     try:
         limit, lines = time.monotonic() + 30, []
         while not any("pipe_write" in line for line in lines):
@@ -98,7 +104,7 @@ def test_an_empty_version_file_is_put_back_from_the_log(site):
     assert site.install(Patch("yn").file("bin/tool")).status == 9
     messages = [line.message for line in site.home.log().runs[0].lines]
     start = messages.index(f"ORVComponentRegistry::buildComponent({site.home.path}/registry/ynlpp266.ver) entry")
-    text = "\n".join(messages[start:messages.index("ORVComponentRegistry::buildComponent exit", start)])
+    text = "\n".join(messages[start : messages.index("ORVComponentRegistry::buildComponent exit", start)])
     level = re.search(r"^Version string provided: (\w+)", text, re.M)[1]
     prereqs = re.findall(r"^Added preReqALL value = (\w+)", text, re.M)
     assert (level, prereqs) == ("06100000", ["oxlpp266", "ullpp266"])

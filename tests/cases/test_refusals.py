@@ -20,6 +20,7 @@ def refused(site, action, target, status, message):
 
 # --- the path and the name -----------------------------------------------------------------------------
 
+
 @pytest.mark.parametrize("action", ACTIONS)
 def test_a_path_that_is_not_there(site, action):
     path = site.patch_dir / "absent"
@@ -44,20 +45,34 @@ def test_a_directory_without_applicable_files(site, action):
     refused(site, action, site.patch_dir, 32, text("ERROR_DCFPP_NO_APPLICABLE", site.patch_dir))
     assert site.logged("INFO")[:-1] == [
         text("DCFPP_PROCESS_DIR", "patches"),
-        *[line for name in site.listed() for line in (
-            text("DCFPP_PROCESS_PATCH", name), text("DCFPP_NOT_APPLICABLE", site.patch_dir / name))]]
+        *[
+            line
+            for name in site.listed()
+            for line in (text("DCFPP_PROCESS_PATCH", name), text("DCFPP_NOT_APPLICABLE", site.patch_dir / name))
+        ],
+    ]
     assert site.changes() == []
 
 
 NAMES = [
-    "readme.txt", "kox_lpp266_vema_fp0001", "kox_lpp266_vemx_fp0001.tar", "kox_lpp266_VEMA_fp0001.tar",
-    "kx_lpp266_vema_fp0001.tar", "kox_lpp_266_vema_fp0001.tar", "KOX_LPP266_VEMA_FP0001.TAR",
-    "kox_ia64_vema_fp0001.tar",                                    # no platform
-    "kox_li6243_vema_fp0001.tar", "kox_winnt_vema_fp0001.tar",     # other platforms
-    "kox_lpp264_vema_fp0001.tar", "kox_unix_vema_fp0001.tar",      # no version file of that platform
-    "kyn_lpp266_vema_fp0001.tar", "kyn_lpp266_vecm_fp0001.tar",    # not installed
-    "kox_lpp266_veps_fp0001.tar", "kox_lpp266_vepd_fp0001.tar",    # no portal, no client
-    "kox_lpp266_vems_fp0001.tar", "kqa_lpp266_vems_fp0001.tar",    # no server support, no server
+    "readme.txt",
+    "kox_lpp266_vema_fp0001",
+    "kox_lpp266_vemx_fp0001.tar",
+    "kox_lpp266_VEMA_fp0001.tar",
+    "kx_lpp266_vema_fp0001.tar",
+    "kox_lpp_266_vema_fp0001.tar",
+    "KOX_LPP266_VEMA_FP0001.TAR",
+    "kox_ia64_vema_fp0001.tar",  # no platform
+    "kox_li6243_vema_fp0001.tar",
+    "kox_winnt_vema_fp0001.tar",  # other platforms
+    "kox_lpp264_vema_fp0001.tar",
+    "kox_unix_vema_fp0001.tar",  # no version file of that platform
+    "kyn_lpp266_vema_fp0001.tar",
+    "kyn_lpp266_vecm_fp0001.tar",  # not installed
+    "kox_lpp266_veps_fp0001.tar",
+    "kox_lpp266_vepd_fp0001.tar",  # no portal, no client
+    "kox_lpp266_vems_fp0001.tar",
+    "kqa_lpp266_vems_fp0001.tar",  # no server support, no server
 ]
 
 
@@ -87,11 +102,7 @@ def test_nothing_is_loaded_from_a_device(site):
 
 # --- the archive and its descriptor --------------------------------------------------------------------
 
-ARCHIVES = {
-    "no tar archive": b"no archive",
-    "empty file": b"",
-    "archive without a descriptor": None,
-}
+ARCHIVES = {"no tar archive": b"no archive", "empty file": b"", "archive without a descriptor": None}
 
 
 @pytest.mark.parametrize("content", ARCHIVES.values(), ids=ARCHIVES)
@@ -146,8 +157,9 @@ def temporary_area_is_closed(site):
     site.home.mkdir("tmp", 0o555)
 
 
-@pytest.mark.parametrize("spoil", [
-    temporary_area_is_a_file, temporary_directory_is_a_dangling_link, temporary_area_is_closed])
+@pytest.mark.parametrize(
+    "spoil", [temporary_area_is_a_file, temporary_directory_is_a_dangling_link, temporary_area_is_closed]
+)
 def test_a_temporary_directory_that_cannot_be_made(site, spoil):
     site.home.component("ox")
     path = site.target(Patch("ox"))
@@ -176,8 +188,11 @@ def test_a_temporary_directory_that_cannot_be_entered(site, spoil):
 
 DESCRIPTORS = {
     "no ProductInfo": ("[Other]\n", 6, text("ERROR_PATCH_MISSING_SECTION", "ProductInfo")),
-    "a property is missing": ("[ProductInfo]\nproductBinArch = x\nproductEXE = x\n", 7,
-                              text("ERROR_PATCH_MISSING_PROP", "productLvl")),
+    "a property is missing": (
+        "[ProductInfo]\nproductBinArch = x\nproductEXE = x\n",
+        7,
+        text("ERROR_PATCH_MISSING_PROP", "productLvl"),
+    ),
 }
 
 
@@ -201,6 +216,7 @@ def test_a_descriptor_that_cannot_be_read(site, action):
 
 # --- what is installed ---------------------------------------------------------------------------------
 
+
 def old(patch, installed):
     return 11, text("ERROR_PP_OLD_PATCH", patch, installed)
 
@@ -223,7 +239,10 @@ LEVELS = {  # installed level, the patch, the problem
     "older modification": ("06100100", Patch("ox", level="06100005"), old("06.10.00.05", "06.10.01.00")),
     "older fix level": ("06100005", Patch("ox", level="06100004"), old("06.10.00.04", "06.10.00.05")),
     "a newer release is another product": (
-        "06100005", Patch("ox", level="06200001"), wrong("kox", "06.10.00.05", "06.20.00.00")),
+        "06100005",
+        Patch("ox", level="06200001"),
+        wrong("kox", "06.10.00.05", "06.20.00.00"),
+    ),
     "a newer version too": ("06.10.00", Patch("ox", level="07100001"), wrong("kox", "06.10.00.00", "07.10.00.00")),
     "another product than the name says": ("06100000", Patch("ox", code="gl"), unknown("kgl")),
     "a version file without a level": ("", Patch("ox"), unknown("kox")),
@@ -251,7 +270,9 @@ REQUIRED = {  # prerequisites, the problem; installed are kgl 06.10.00.05 (lpp26
     "digits": ({"KGL": "062000"}, wrong("kgl", "06.10.00.05", "06.20.00.00")),
     "eight digits": ({"gl": "06100105"}, wrong("kgl", "06.10.00.05", "06.10.01.05")),
     "the first that fails, in the order of codes": (
-        {"zz": "06.10.00.00", "gl": "06.20.00.00"}, wrong("kgl", "06.10.00.05", "06.20.00.00")),
+        {"zz": "06.10.00.00", "gl": "06.20.00.00"},
+        wrong("kgl", "06.10.00.05", "06.20.00.00"),
+    ),
     "of the platform that the component asks for": ({"ul": "06.20.04"}, wrong("kul", "06.20.03.00", "06.20.04.00")),
     "a platform of none is looked up": ({"ne": "06.10.00"}, missing("kne", "06.10.00.00")),
     "the console's command line is another kind": ({"zt": "06.10.00"}, missing("kzt", "06.10.00.00")),
@@ -280,6 +301,7 @@ def test_prerequisites_that_are_met(site):
 
 
 # --- what is running -----------------------------------------------------------------------------------
+
 
 def refused_as_running(site, patch, status, key):
     """The explanation is printed at once, the error record then holds an empty text."""

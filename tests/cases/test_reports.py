@@ -35,7 +35,8 @@ def site(site):
 
 def test_the_least_report(site):
     path = site.target(Patch("ox").directory())
-    assert site.report(path) == site.done(f"""
+    assert site.report(path) == site.done(
+        f"""
 {RULE}
 Processing patch file: {path}
     Fix pack fp0001 for kox
@@ -50,7 +51,8 @@ The following files will be installed or replaced with new files:
 
 No commands to be executed before starting the agent instances.
 
-""")
+"""
+    )
     assert site.changes() == []
 
 
@@ -58,10 +60,15 @@ def test_the_whole_report(site):
     site.home.start("ox")
     site.home.start("yn", "north")
     site.home.start("yn", "south")
-    path = site.target(Patch("ox", title="Fix pack 1: 100%s", dependents=["yn"], **ALL_COMMANDS)
-                       .file("bin/lib/liba.so").file("bin/tool").file("readme"))
+    path = site.target(
+        Patch("ox", title="Fix pack 1: 100%s", dependents=["yn"], **ALL_COMMANDS)
+        .file("bin/lib/liba.so")
+        .file("bin/tool")
+        .file("readme")
+    )
     home = site.home.path
-    assert site.report(path) == site.done(f"""
+    assert site.report(path) == site.done(
+        f"""
 {RULE}
 Processing patch file: {path}
     Fix pack 1: 100%s
@@ -87,20 +94,25 @@ The following commands will be executed before restarting any previously stopped
     10 --last
     z
 
-""")
+"""
+    )
     assert site.changes() == []
 
 
-@pytest.mark.parametrize("when, shown", [
-    ("pre_patch", (text("PP_TEST_PREPATCHSCRIPT") + "\n    go.sh\n\n", NO_PRE, NO_POST)),
-    ("pre", (NO_PRE_PATCH, text("PP_TEST_PRESCRIPT") + "\n    go.sh\n", NO_POST)),
-    ("post", (NO_PRE_PATCH, NO_PRE, text("PP_TEST_POSTSCRIPT") + "\n    go.sh\n\n")),
-])
+@pytest.mark.parametrize(
+    "when, shown",
+    [
+        ("pre_patch", (text("PP_TEST_PREPATCHSCRIPT") + "\n    go.sh\n\n", NO_PRE, NO_POST)),
+        ("pre", (NO_PRE_PATCH, text("PP_TEST_PRESCRIPT") + "\n    go.sh\n", NO_POST)),
+        ("post", (NO_PRE_PATCH, NO_PRE, text("PP_TEST_POSTSCRIPT") + "\n    go.sh\n\n")),
+    ],
+)
 def test_one_command_list(site, when, shown):
     before, after, last = shown
     path = site.target(Patch("ox").file("readme").command(when, "go.sh"))
     assert site.report(path) == site.done(
-        head(path) + before + NO_INSTANCES + after + FILES + f"    {site.home.path}/readme\n\n" + last)
+        head(path) + before + NO_INSTANCES + after + FILES + f"    {site.home.path}/readme\n\n" + last
+    )
 
 
 def test_a_command_is_cut_at_its_equal_sign(site):
@@ -123,11 +135,22 @@ def test_the_report_on_two_patches(site):
     first = Patch("ox", title="Patch of the OS agent").file("bin/ox")
     second = Patch("yn", title="Patch of Yellow Net", post=["go.sh"]).file("bin/yn")
     reports = {
-        first.filename: head(site.patch_dir / first.filename, first.title) + NO_PRE_PATCH + NO_INSTANCES
-        + NO_PRE + FILES + f"    {site.home.path}/bin/ox\n\n" + NO_POST,
-        second.filename: head(site.patch_dir / second.filename, second.title) + NO_PRE_PATCH + STOPPED
-        + f"    north instance of {YN}\n\n" + NO_PRE + FILES + f"    {site.home.path}/bin/yn\n\n"
-        + text("PP_TEST_POSTSCRIPT") + "\n    go.sh\n\n",
+        first.filename: head(site.patch_dir / first.filename, first.title)
+        + NO_PRE_PATCH
+        + NO_INSTANCES
+        + NO_PRE
+        + FILES
+        + f"    {site.home.path}/bin/ox\n\n"
+        + NO_POST,
+        second.filename: head(site.patch_dir / second.filename, second.title)
+        + NO_PRE_PATCH
+        + STOPPED
+        + f"    north instance of {YN}\n\n"
+        + NO_PRE
+        + FILES
+        + f"    {site.home.path}/bin/yn\n\n"
+        + text("PP_TEST_POSTSCRIPT")
+        + "\n    go.sh\n\n",
     }
     folder = site.target(first, second)
     assert site.report(f"{folder}/") == site.done("".join(reports[name] for name in site.listed()))
@@ -147,6 +170,7 @@ def test_the_log_tells_where_each_file_comes_from(site):
 
 
 # --- which instances are listed ------------------------------------------------------------------------
+
 
 def listed(site, *lines):
     """The part between the two command lists."""
@@ -209,6 +233,7 @@ def test_a_support_patch_lists_no_instances(site):
 
 # --- reports that fail ---------------------------------------------------------------------------------
 
+
 def test_the_code_of_a_stray_line_is_that_of_a_report_without_files(site):
     # Nothing failed but the search for files, which leaves the record alone: it still holds the stray line.
     text_of_patch = "stray\n" + Patch("ox", exe="x").descriptor_text()
@@ -237,4 +262,7 @@ def test_the_code_of_a_clean_up_is_that_of_a_second_report_without_files(site):
     names = site.listed()
     Patch("ox", fixpack=names[0][-10:-4]).directory().write(folder)
     result = site.report(folder)
-    assert (result.status, result.err) == (27, f"Unable to remove temporary directory: {site.home.prefix}tmp/kox\n".encode())
+    assert (result.status, result.err) == (
+        27,
+        f"Unable to remove temporary directory: {site.home.prefix}tmp/kox\n".encode(),
+    )

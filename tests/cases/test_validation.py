@@ -5,14 +5,17 @@ import pytest
 from support import Patch
 from support.catalogue import text
 
-INFO = ("[ProductInfo]\nproductCode = kox\npatchName = N\npatchDescriptiveName = T\nproductVer = 06\n"
-        "productRel = 10\nproductMod = 00\nproductLvl = 01\n")
+INFO = (
+    "[ProductInfo]\nproductCode = kox\npatchName = N\npatchDescriptiveName = T\nproductVer = 06\n"
+    "productRel = 10\nproductMod = 00\nproductLvl = 01\n"
+)
 OPTIONAL = "productBinArch = lpp266\nproductEXE = kox.exe\n"
 FULL = INFO + OPTIONAL
 
 ACCEPTED = {
-    "everything": Patch("ox", exe="x", prereqs={"gl": "06.10.00.00"}, dependents=["all"], pre_patch=["a"],
-                        pre=["b"], post=["c"]).descriptor_text(),
+    "everything": Patch(
+        "ox", exe="x", prereqs={"gl": "06.10.00.00"}, dependents=["all"], pre_patch=["a"], pre=["b"], post=["c"]
+    ).descriptor_text(),
     "only what is required": INFO,
     "white space, comments, DOS line ends": " # comment\r\n\r\n" + FULL.replace("\n", " \t\r\n").replace(" = ", "="),
     "header without a closing bracket keeps all but its last character": FULL.replace("[ProductInfo]", "[ProductInfo?"),
@@ -51,11 +54,17 @@ REFUSED = {
     "a repeated section forgets the first": (FULL + "[ProductInfo]\n", property_missing("productEXE")),
     **{f"no {key}": (without(key, FULL), property_missing(key)) for key in REQUIRED},
     "of several, the last required one": (
-        without("patchName", without("productCode", FULL)), property_missing("patchName")),
+        without("patchName", without("productCode", FULL)),
+        property_missing("patchName"),
+    ),
     "a missing productBinArch hides it": (
-        without("productBinArch", without("productVer", FULL)), property_missing("productBinArch")),
+        without("productBinArch", without("productVer", FULL)),
+        property_missing("productBinArch"),
+    ),
     "a missing productEXE hides it": (
-        without("productEXE", without("productVer", FULL)), property_missing("productEXE")),
+        without("productEXE", without("productVer", FULL)),
+        property_missing("productEXE"),
+    ),
     "and productBinArch too": (without("productVer", INFO), property_missing("productEXE")),
 }
 
@@ -71,8 +80,7 @@ def test_a_descriptor_that_is_not_there(site):
     path = site.patch_dir / "absent.ini"
     expected = text("ERROR_INIFILE_CANT_READ", path, "No such file or directory")
     assert site.validate(path) == site.failed(5, expected)
-    assert site.logged("ERROR") == [
-        f"unable to stat file: {path}", expected, text("ERROR_INIFILE_PARSE", path)]
+    assert site.logged("ERROR") == [f"unable to stat file: {path}", expected, text("ERROR_INIFILE_PARSE", path)]
 
 
 def test_a_directory_is_no_descriptor(site):
@@ -87,8 +95,7 @@ def test_a_descriptor_that_cannot_be_opened(site):
     path.chmod(0)
     expected = text("ERROR_INIFILE_CANT_READ", path, "Invalid argument")
     assert site.validate(path) == site.failed(5, expected)
-    assert site.logged("ERROR") == [
-        f"unable to open file: {path}", expected, text("ERROR_INIFILE_PARSE", path)]
+    assert site.logged("ERROR") == [f"unable to open file: {path}", expected, text("ERROR_INIFILE_PARSE", path)]
 
 
 def test_a_stray_line_is_reported_in_the_log_alone(site):

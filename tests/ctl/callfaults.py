@@ -20,9 +20,15 @@ ALL = os.environ.get("ORVPATCH_FAULTS") == "all"
 _FIRST_OWN_CALL = "rt_sigaction(SIGCHLD, {sa_handler=SIG_DFL"
 _CALL = re.compile(r"^(\w+)\(")
 # No faults but answers: nothing is there, or this user may not see it.
-_ANSWERS = {"look": {"ENOENT", "EACCES"}, "open": {"ENOENT", "EACCES"}, "list": {"ENOENT"}, "link": {"ENOENT", "EXDEV"},
-            "attributes": {"ENOENT"}, "make": {"ENOENT"},
-            "seek": {"EIO"}}  # in a file that can be sought in, to a place that it has
+_ANSWERS = {
+    "look": {"ENOENT", "EACCES"},
+    "open": {"ENOENT", "EACCES"},
+    "list": {"ENOENT"},
+    "link": {"ENOENT", "EXDEV"},
+    "attributes": {"ENOENT"},
+    "make": {"ENOENT"},
+    "seek": {"EIO"},
+}  # in a file that can be sought in, to a place that it has
 # Each process of the host is looked at by the same calls: a few of them stand for all.
 _PROCESS = re.compile(r"/proc/\d+")
 _PROCESSES = 3
@@ -83,8 +89,10 @@ def faults_of(trace):
 def chosen(faults, count):
     only = os.environ.get("ORVPATCH_FAULTS_ONLY")
     if only:
-        return [Fault(call, int(ordinal), error, mode)
-                for call, ordinal, error, mode in (name.split(":") for name in only.split(","))]
+        return [
+            Fault(call, int(ordinal), error, mode)
+            for call, ordinal, error, mode in (name.split(":") for name in only.split(","))
+        ]
     return random.Random(SEED).sample(faults, len(faults) if ALL else min(count, len(faults)))
 
 
@@ -122,7 +130,7 @@ def document_of(result, fault=None):
     be given no pipe has written before it, as it does in the installer (see pipes-always-true in docs/decisions.md)."""
     out = result.out
     if fault and kind_of(fault.call) == "pipe":
-        out = out[max(out.find(b'{\n "'), out.find(b'{\n  "'), out.find(b'{"'), 0):]
+        out = out[max(out.find(b'{\n "'), out.find(b'{\n  "'), out.find(b'{"'), 0) :]
     try:
         return json.loads(out)
     except ValueError:

@@ -63,15 +63,18 @@ def refused(status):
     def harm(stage):
         assert stage.install().status == status
         assert not stage.home.exists("bin/tool")
+
     return harm
 
 
 def silently_without(path):
     """The run is a success, and this file is not there."""
+
     def harm(stage):
         result = stage.install()
         assert (result.status, result.out) == (0, GOOD)
         assert not stage.home.exists(path)
+
     return harm
 
 
@@ -79,6 +82,7 @@ def journal_lacks(call):
     def harm(stage):
         assert stage.install().status == 0
         assert call not in stage.home.calls()
+
     return harm
 
 
@@ -163,9 +167,13 @@ def waits_for_ever(stage):
     user = "nobody" if os.geteuid() == 0 else None
     if user:
         stage.home.give_to(user)
-    process = subprocess.Popen([*stage.program.argv_for(user), "-h", stage.home, "-i", stage.path],
-                               stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL, start_new_session=True,
-                               **identity(user))
+    process = subprocess.Popen(
+        [*stage.program.argv_for(user), "-h", stage.home, "-i", stage.path],
+        stdout=subprocess.DEVNULL,
+        stderr=subprocess.DEVNULL,
+        start_new_session=True,
+        **identity(user),
+    )
     try:
         while not any("pipe_write" in place for place in _waits_of(process.pid)):
             assert process.poll() is None, "the run has ended"
@@ -391,8 +399,12 @@ CASES = [
     Case("name-grammar", lambda folder: patch().write(folder, "kox_lpp266_vema.tar"), refused(34)),
     Case("name-product-differs", writes(lambda: patch(descriptor(), product="KOX")), silently_without("bin/tool")),
     Case("family-not-taken", writes(lambda: patch(platform="li6263")), refused(34)),
-    Case("support-patch", writes(lambda: patch(target="vems")), refused_on_every_home,
-         {"files": ["config/.ConfigData/kqaenv"]}),
+    Case(
+        "support-patch",
+        writes(lambda: patch(target="vems")),
+        refused_on_every_home,
+        {"files": ["config/.ConfigData/kqaenv"]},
+    ),
     Case("vecm-product", writes(lambda: patch(target="vecm")), refused_on_every_home),
     Case("no-descriptor", lambda folder: patch().write(folder, dotted=True), refused(3)),
     Case("descriptor-invalid", writes(lambda: patch(descriptor().replace("patchName", "patchname"))), refused(7)),
@@ -401,42 +413,74 @@ CASES = [
     Case("tar-too-loud", many_members_that_tar_speaks_of, waits_for_ever),
     Case("checksum-differs", listed_otherwise, installed_unseen),
     Case("link-member", link_to_a_secret, secret_is_opened),
-    Case("hard-link-member", writes(lambda: raw().hard_link("updated_files/bin/second", "updated_files/bin/tool")),
-         loses_its_mode),
+    Case(
+        "hard-link-member",
+        writes(lambda: raw().hard_link("updated_files/bin/second", "updated_files/bin/tool")),
+        loses_its_mode,
+    ),
     Case("special-member", writes(lambda: raw().fifo("updated_files/bin/pipe")), pipe_in_the_home),
     Case("unsafe-name", writes(lambda: raw().file("/updated_file/tool2")), silently_without("updated_file/tool2")),
     Case("unsafe-name", writes(lambda: raw().file("updated_files/../../outside")), refused(3)),
     Case("long-name", writes(lambda: raw().file("updated_files/" + "n" * 256)), refused(3)),
-    Case("updated-files-no-directory",
-         writes(lambda: Patch("ox").member("updated_files", "x").script("10_first.sh", when="pre_patch")),
-         fails_after_the_first_commands),
+    Case(
+        "updated-files-no-directory",
+        writes(lambda: Patch("ox").member("updated_files", "x").script("10_first.sh", when="pre_patch")),
+        fails_after_the_first_commands,
+    ),
     Case("closed-directory", closed_to_its_owner, inside_is_missing),
     Case("nul-byte", writes(lambda: script(descriptor("\0\n[PreCommands]\n10_first.sh\n"))), ignored("10_first.sh")),
-    Case("section-twice", writes(lambda: script(descriptor("[PreCommands]\n10_first.sh\n[PreCommands]\n"))),
-         ignored("10_first.sh")),
-    Case("key-twice", writes(lambda: patch(descriptor("[PreReqs]\nkyn = 06.20.00\nyn = 06.10.00\n"))),
-         installed_without_the_prerequisite),
-    Case("key-twice", writes(lambda: patch(descriptor() + "patchName = second\n")),
-         lambda stage: (installed_unseen(stage), one_value_in_the_history(stage))),
+    Case(
+        "section-twice",
+        writes(lambda: script(descriptor("[PreCommands]\n10_first.sh\n[PreCommands]\n"))),
+        ignored("10_first.sh"),
+    ),
+    Case(
+        "key-twice",
+        writes(lambda: patch(descriptor("[PreReqs]\nkyn = 06.20.00\nyn = 06.10.00\n"))),
+        installed_without_the_prerequisite,
+    ),
+    Case(
+        "key-twice",
+        writes(lambda: patch(descriptor() + "patchName = second\n")),
+        lambda stage: (installed_unseen(stage), one_value_in_the_history(stage)),
+    ),
     Case("stray-line", writes(lambda: patch("remark\n" + descriptor())), error_in_the_log),
-    Case("looks-like-section", writes(lambda: script(descriptor("[Precommands]\n10_first.sh\n"))),
-         ignored("10_first.sh")),
-    Case("looks-like-section", writes(lambda: script(descriptor("[PreCommands\n10_first.sh\n"))),
-         ignored("10_first.sh")),
-    Case("looks-like-section", writes(lambda: script(descriptor("[PreCommands] before\n10_first.sh\n"))),
-         ignored("10_first.sh")),
-    Case("level-digits", writes(lambda: patch(descriptor(level={"productMod": "1", "productLvl": "0"}))),
-         breaks_the_version_file),
+    Case(
+        "looks-like-section", writes(lambda: script(descriptor("[Precommands]\n10_first.sh\n"))), ignored("10_first.sh")
+    ),
+    Case(
+        "looks-like-section", writes(lambda: script(descriptor("[PreCommands\n10_first.sh\n"))), ignored("10_first.sh")
+    ),
+    Case(
+        "looks-like-section",
+        writes(lambda: script(descriptor("[PreCommands] before\n10_first.sh\n"))),
+        ignored("10_first.sh"),
+    ),
+    Case(
+        "level-digits",
+        writes(lambda: patch(descriptor(level={"productMod": "1", "productLvl": "0"}))),
+        breaks_the_version_file,
+    ),
     Case("level-digits", writes(lambda: patch(descriptor(level={"productVer": "6"}))), refused(10)),
     Case("prereq-level", writes(lambda: patch(descriptor("[PreReqs]\nyn = 5.20\n"))), takes_the_default_level),
     Case("prereq-kind", writes(lambda: patch(descriptor("[PreReqs]\nqa = 06.10.00\n"))), refused_on_every_home),
     Case("all-is-hidden", writes(lambda: patch(descriptor("[Dependents]\nAX\nall\n"))), leaves_an_agent_running),
-    Case("command-cut", writes(lambda: script(descriptor("[PreCommands]\n10_first.sh=fast\n"))
-                               .member("10_first.sh", "#!/bin/sh\nexit 3\n", 0o755)), fails_half_way),
+    Case(
+        "command-cut",
+        writes(
+            lambda: script(descriptor("[PreCommands]\n10_first.sh=fast\n")).member(
+                "10_first.sh", "#!/bin/sh\nexit 3\n", 0o755
+            )
+        ),
+        fails_half_way,
+    ),
     Case("command-has-blank", writes(lambda: script(descriptor("[PreCommands]\n10_first.sh fast\n"))), fails_half_way),
     Case("command-not-found", writes(lambda: patch(descriptor("[PreCommands]\n10_absent.sh\n"))), fails_half_way),
-    Case("command-not-executable", writes(lambda: script(descriptor("[PreCommands]\n10_first.sh\n"), mode=0o644)),
-         fails_half_way),
+    Case(
+        "command-not-executable",
+        writes(lambda: script(descriptor("[PreCommands]\n10_first.sh\n"), mode=0o644)),
+        fails_half_way,
+    ),
     Case("command-twice", writes(lambda: script(descriptor("[PreCommands]\n10_first.sh\n10_first.sh\n"))), runs_once),
     Case("same-product-twice", older_one_last, ends_at_the_older_level),
     Case("prereq-in-same-set", prerequisite_beside_it, none_is_installed),
@@ -450,8 +494,9 @@ CASES = [
     Case("odd-name", writes(lambda: raw().file("updated_files/bin/a\ntool")), report_has_a_torn_line),
     Case("product-exe-unused", writes(lambda: patch(descriptor() + "productEXE = kox.exe\n")), copies_stay_old),
     Case("set-id-member", writes(lambda: raw().file("updated_files/bin/suid", mode=0o4755)), bits_are_lost),
-    Case("foreign-owner", writes(lambda: raw().file("updated_files/bin/owned", uid=12345, gid=54321)),
-         belongs_to_another),
+    Case(
+        "foreign-owner", writes(lambda: raw().file("updated_files/bin/owned", uid=12345, gid=54321)), belongs_to_another
+    ),
     Case("history-columns", writes(lambda: patch(descriptor(name="a name that is much too long"))), columns_break),
     Case("history-columns", writes(lambda: patch(descriptor(name="a | b"))), columns_break),
 ]

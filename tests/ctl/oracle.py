@@ -47,8 +47,10 @@ def _describe(path, status):
         "owner": (status.st_uid, status.st_gid),
         "time": None if is_directory else status.st_mtime_ns,
         "content": _content(path, status),
-        "attributes": {name: os.getxattr(path, name, follow_symlinks=False)
-                       for name in sorted(os.listxattr(path, follow_symlinks=False))},
+        "attributes": {
+            name: os.getxattr(path, name, follow_symlinks=False)
+            for name in sorted(os.listxattr(path, follow_symlinks=False))
+        },
     }
 
 

@@ -24,8 +24,9 @@ def ready(home):
 
 
 def a_patch(code="yn", **options):
-    return (Patch(code, **options).file("lib/replaced", "new\n").file("lib/new", "new\n")
-            .file("fresh/deep/file", "new\n"))
+    return (
+        Patch(code, **options).file("lib/replaced", "new\n").file("lib/new", "new\n").file("fresh/deep/file", "new\n")
+    )
 
 
 def apply(ctl, home, path, *options, status=0):
@@ -65,7 +66,10 @@ def test_new_directories_get_mode_and_owner_of_their_parents(ctl, ready, write):
     home.mkdir("opened", 0o2750)
     apply(ctl, home, write(Patch("yn").file("opened/a/b/file").file("other/file")))
     assert [oct((home.path / path).stat().st_mode & 0o7777) for path in ("opened/a", "opened/a/b", "other")] == [
-        "0o2750", "0o2750", oct(home.path.stat().st_mode & 0o7777)]
+        "0o2750",
+        "0o2750",
+        oct(home.path.stat().st_mode & 0o7777),
+    ]
 
 
 @pytest.mark.needs_root
@@ -89,8 +93,9 @@ def test_attributes_links_and_times_come_back(ctl, ready, write, scratch):
     assert listing(home) == before
 
 
-@pytest.mark.parametrize("target, code", [("vema", "ox"), ("vems", "qa"), ("veps", "pt"), ("vepd", "dk"),
-                                          ("vecm", "zt")])
+@pytest.mark.parametrize(
+    "target, code", [("vema", "ox"), ("vems", "qa"), ("veps", "pt"), ("vepd", "dk"), ("vecm", "zt")]
+)
 def test_each_target_is_taken_back(ctl, ready, write, target, code):
     home = ready
     home.component(code)
@@ -109,7 +114,9 @@ def test_instances_run_again_after_apply_and_undo(ctl, ready, write):
     document = apply(ctl, home, write(a_patch()))
     assert document["verdict"] == "applied"
     assert sorted((one["product"], one["name"]) for one in document["instances"]["before"]) == [
-        ("kum", ""), ("kyn", "north")]
+        ("kum", ""),
+        ("kyn", "north"),
+    ]
     assert home.instances() == before
     undo(ctl, home)
     assert home.instances() == before
@@ -165,8 +172,14 @@ def test_findings_refuse_before_anything_changes(ctl, ready, write):
     assert document["verdict"] == "refused"
     assert "installer-refuses" in [finding["rule"] for finding in document["findings"]]
     after = home.tree()
-    for changed in ("patchlogs", "patchlogs/orvpatch.log", "patchlogs/transactions", "tmp", "tmp/kyn",
-                    "tmp/kyn/patch.ini"):
+    for changed in (
+        "patchlogs",
+        "patchlogs/orvpatch.log",
+        "patchlogs/transactions",
+        "tmp",
+        "tmp/kyn",
+        "tmp/kyn/patch.ini",
+    ):
         before.pop(changed, None)
         after.pop(changed, None)
     assert after == before
@@ -200,7 +213,9 @@ def test_a_file_that_was_changed_since_is_left_alone(ctl, ready, write):
     home.write("lib/new", "mine\n")
     taken = undo(ctl, home, status=4)
     assert (taken["verdict"], taken["messages"]) == (
-        "incomplete", ["lib/new: changed since the installation, left as it is"])
+        "incomplete",
+        ["lib/new: changed since the installation, left as it is"],
+    )
     assert home.read("lib/new") == b"mine\n"
     assert home.read("lib/replaced") == b"old\n"
 
@@ -329,8 +344,13 @@ def test_what_others_did_before_the_installation_began_stays(ctl, ready, write):
     for path in ("lib/replaced", "lib/other"):
         home.write(path, "old\n")
     archive = write(a_patch().file("lib/other", "new\n"))
-    result = ctl.run("apply", home, archive, "--yes",  # killed as it puts on disk what it has saved
-                     wrapper=["strace", "-o", "/dev/null", "-e", "inject=syncfs:signal=SIGKILL:when=1"])
+    result = ctl.run(
+        "apply",
+        home,
+        archive,
+        "--yes",  # killed as it puts on disk what it has saved
+        wrapper=["strace", "-o", "/dev/null", "-e", "inject=syncfs:signal=SIGKILL:when=1"],
+    )
     assert result.status == -signal.SIGKILL, result
     home.write("lib/new", "the administrator's\n")
     home.remove("lib/replaced")

@@ -19,7 +19,14 @@ def tree(ctl, scratch):
     """A source tree with commands, what they need, and files."""
     folder = scratch / "tree"
     assert ctl.run("new", folder, "--product", "ox", "--level", "06.10.01.00").status == 0
-    for path in ("updated_files/bin/tool", "updated_files/b", "updated_files/b.d/x", "data/table", "20-more.sh", ".git"):
+    for path in (
+        "updated_files/bin/tool",
+        "updated_files/b",
+        "updated_files/b.d/x",
+        "data/table",
+        "20-more.sh",
+        ".git",
+    ):
         (folder / path).parent.mkdir(parents=True, exist_ok=True)
         (folder / path).write_text(f"{path}\n")
     (folder / "updated_files/bin/tool").chmod(0o755)
@@ -45,8 +52,10 @@ def contents(folder):
 
 
 @pytest.mark.parametrize("words", [[], ["--name", "second", "--description", "A second 100 % try"]])
-@pytest.mark.parametrize("product, target", [
-    ("kyn", "vema"), ("yn", "vema"), ("kqa", "vems"), ("kpt", "veps"), ("kdk", "vepd"), ("zt", "vecm")])
+@pytest.mark.parametrize(
+    "product, target",
+    [("kyn", "vema"), ("yn", "vema"), ("kqa", "vems"), ("kpt", "veps"), ("kdk", "vepd"), ("zt", "vecm")],
+)
 def test_what_new_makes_is_built_without_a_finding(ctl, scratch, out, product, target, words):
     made = ctl.document("new", scratch / "tree", "--product", product, "--level", "06.10.00.02", *words)
     assert sorted(made["files"]) == sorted(os.listdir(scratch / "tree"))
@@ -79,9 +88,17 @@ def test_new_refuses_what_exists(ctl, scratch, make):
     assert os.lstat(scratch / "tree").st_mtime_ns == before
 
 
-@pytest.mark.parametrize("product, level, more", [
-    ("k", "06.10.00.02", []), ("k/n", "06.10.00.02", []), ("kyn", "6.1", []), ("kyn", "06.1000.02", []),
-    ("kyn", "06.10.00.0x", []), ("kyn", "06.10.00.02", ["--name", "a\nb"])])
+@pytest.mark.parametrize(
+    "product, level, more",
+    [
+        ("k", "06.10.00.02", []),
+        ("k/n", "06.10.00.02", []),
+        ("kyn", "6.1", []),
+        ("kyn", "06.1000.02", []),
+        ("kyn", "06.10.00.0x", []),
+        ("kyn", "06.10.00.02", ["--name", "a\nb"]),
+    ],
+)
 def test_new_makes_nothing_of_what_is_no_product_and_no_level(ctl, scratch, product, level, more):
     result = ctl.run("new", scratch / "tree", "--product", product, "--level", level, *more)
     assert (result.status, result.out) == (2, b"")
@@ -97,14 +114,30 @@ def test_members_come_in_their_order_and_plain(ctl, tree, out):
     listing = subprocess.run(["tar", "-tf", archive], stdout=subprocess.PIPE, stderr=subprocess.PIPE, check=True)
     assert listing.stderr == b""
     assert listing.stdout.decode().splitlines() == [
-        "patch.ini", "10-prepare.sh", "20-more.sh", "data/", "data/table", "updated_files/", "updated_files/b",
-        "updated_files/b.d/", "updated_files/b.d/x", "updated_files/bin/", "updated_files/bin/tool"]
+        "patch.ini",
+        "10-prepare.sh",
+        "20-more.sh",
+        "data/",
+        "data/table",
+        "updated_files/",
+        "updated_files/b",
+        "updated_files/b.d/",
+        "updated_files/b.d/x",
+        "updated_files/bin/",
+        "updated_files/bin/tool",
+    ]
     with tarfile.open(archive) as opened:
         members = {member.name: member for member in opened}
     assert {(member.uid, member.gid, member.uname, member.gname) for member in members.values()} == {(0, 0, "", "")}
     modes = {name: member.mode for name, member in members.items()}
     assert {name for name, mode in modes.items() if mode == 0o755} == {
-        "10-prepare.sh", "data", "updated_files", "updated_files/b.d", "updated_files/bin", "updated_files/bin/tool"}
+        "10-prepare.sh",
+        "data",
+        "updated_files",
+        "updated_files/b.d",
+        "updated_files/bin",
+        "updated_files/bin/tool",
+    }
     assert set(modes.values()) == {0o755, 0o644}
 
 
@@ -115,8 +148,9 @@ def test_the_archive_holds_what_the_tree_holds(ctl, tree, out, scratch):
     (tree / os.fsdecode(b"updated_files/long/\xff\xfe")).write_bytes(b"")
     unpacked = scratch / "unpacked"
     unpacked.mkdir()
-    done = subprocess.run(["tar", "-xf", build(ctl, tree, out)["archive"], "-C", unpacked], stderr=subprocess.PIPE,
-                          check=True)
+    done = subprocess.run(
+        ["tar", "-xf", build(ctl, tree, out)["archive"], "-C", unpacked], stderr=subprocess.PIPE, check=True
+    )
     assert done.stderr == b""
     assert subprocess.run(["diff", "-r", "-x", ".git", tree, unpacked], check=False).returncode == 0
 
@@ -135,13 +169,19 @@ def test_it_is_the_same_bit_for_bit_wherever_it_is_built(ctl, tree, scratch):
     old = os.umask(0o007)
     try:
         user = "nobody" if os.geteuid() == 0 else None
-        second = build(ctl, copy, two, user=user, env={
-            "SOURCE_DATE_EPOCH": EPOCH, "TZ": "Pacific/Auckland", "LC_ALL": "C.UTF-8", "LANG": "de_DE.UTF-8"})
+        second = build(
+            ctl,
+            copy,
+            two,
+            user=user,
+            env={"SOURCE_DATE_EPOCH": EPOCH, "TZ": "Pacific/Auckland", "LC_ALL": "C.UTF-8", "LANG": "de_DE.UTF-8"},
+        )
     finally:
         os.umask(old)
     assert first["sha256"] == second["sha256"]
     assert [content for _, content in sorted(contents(one).items())] == [
-        content for _, content in sorted(contents(two).items())]
+        content for _, content in sorted(contents(two).items())
+    ]
     assert hashlib.sha256((one / "kox_lpp266_vema_fp0100.tar").read_bytes()).hexdigest() == first["sha256"]
 
 
@@ -162,8 +202,12 @@ def test_the_list_keeps_its_other_lines_and_one_for_the_archive(ctl, tree, out):
     name = "kox_lpp266_vema_fp0100.tar"
     assert (out / "SHA256SUMS").read_text() == f"{other}{document['sha256']}  {name}\n"
     assert sorted(contents(out)) == ["SHA256SUMS", name]
-    assert subprocess.run(["sha256sum", "--ignore-missing", "--status", "-c", "SHA256SUMS"], cwd=out,
-                          check=False).returncode == 0
+    assert (
+        subprocess.run(
+            ["sha256sum", "--ignore-missing", "--status", "-c", "SHA256SUMS"], cwd=out, check=False
+        ).returncode
+        == 0
+    )
     assert stat.S_IMODE((out / name).stat().st_mode) == 0o644
 
 
@@ -193,9 +237,15 @@ def test_a_tree_that_lint_refuses_leaves_nothing_behind(ctl, tree, out, kind, ex
     assert contents(out) == before
 
 
-@pytest.mark.parametrize("words, said", [
-    (["{tree}", "-o", "{scratch}/none"], b"No such file"), (["{scratch}/none"], b"no directory"),
-    (["{tree}", "--fixpack", "a/b"], b"no name of a file"), (["{tree}", "--sign", "no-such-key"], b"cannot sign")])
+@pytest.mark.parametrize(
+    "words, said",
+    [
+        (["{tree}", "-o", "{scratch}/none"], b"No such file"),
+        (["{scratch}/none"], b"no directory"),
+        (["{tree}", "--fixpack", "a/b"], b"no name of a file"),
+        (["{tree}", "--sign", "no-such-key"], b"cannot sign"),
+    ],
+)
 def test_what_cannot_be_built_is_status_2_and_leaves_nothing(ctl, tree, out, scratch, words, said):
     words = [word.format(tree=tree, scratch=scratch) for word in words]
     result = ctl.run("build", *words, cwd=out, env={"GNUPGHOME": str(scratch)})
@@ -207,8 +257,7 @@ def test_what_cannot_be_built_is_status_2_and_leaves_nothing(ctl, tree, out, scr
 def test_a_descriptor_that_is_none_is_status_2(ctl, tree, out):
     (tree / "patch.ini").write_text("[ProductInfo]\n")
     result = ctl.run("build", tree, "-o", out)
-    assert (result.status, result.out, result.err) == (
-        2, b"", b"orvpatchctl: Missing required property: productEXE\n")
+    assert (result.status, result.out, result.err) == (2, b"", b"orvpatchctl: Missing required property: productEXE\n")
 
 
 # --- signatures ----------------------------------------------------------------------------------------------------
@@ -220,8 +269,12 @@ def key(tmp_path):
     folder = tmp_path / "g"
     folder.mkdir(mode=0o700)
     environment = {**os.environ, "GNUPGHOME": str(folder)}
-    subprocess.run(["gpg", "--batch", "--passphrase", "", "--quick-gen-key", "builder@example.com", "ed25519", "sign"],
-                   env=environment, check=True, capture_output=True)
+    subprocess.run(
+        ["gpg", "--batch", "--passphrase", "", "--quick-gen-key", "builder@example.com", "ed25519", "sign"],
+        env=environment,
+        check=True,
+        capture_output=True,
+    )
     with open(folder / "public.gpg", "wb") as public:
         subprocess.run(["gpg", "--export"], env=environment, stdout=public, check=True)
     yield folder
@@ -229,8 +282,11 @@ def key(tmp_path):
 
 
 def is_signed(out, key):
-    done = subprocess.run(["gpgv", "--keyring", key / "public.gpg", out / "SHA256SUMS.asc", out / "SHA256SUMS"],
-                          capture_output=True, check=False)
+    done = subprocess.run(
+        ["gpgv", "--keyring", key / "public.gpg", out / "SHA256SUMS.asc", out / "SHA256SUMS"],
+        capture_output=True,
+        check=False,
+    )
     return done.returncode == 0
 
 

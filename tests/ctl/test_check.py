@@ -71,11 +71,14 @@ def test_a_refused_report_leaves_nothing_in_tmp(ctl, ready, write):
 @pytest.mark.parametrize("number", ["INT", "TERM"])
 def test_an_interrupted_report_leaves_nothing_in_tmp(ctl, program, ready, patch, scratch, command, number):
     interrupted = scratch / "interrupted"
-    interrupted.write_text('#!/bin/sh\nmkdir "$2/tmp/kyn" && tar -xf "$4" -C "$2/tmp/kyn" || exit 99\n'
-                           f': >{scratch}/extracted\nkill -{number} $PPID\nexec sleep 60\n')
+    interrupted.write_text(
+        '#!/bin/sh\nmkdir "$2/tmp/kyn" && tar -xf "$4" -C "$2/tmp/kyn" || exit 99\n'
+        f": >{scratch}/extracted\nkill -{number} $PPID\nexec sleep 60\n"
+    )
     interrupted.chmod(0o755)
-    result = ctl.run(command[0], ready, patch, *command[1:], "--installer", interrupted,
-                     wrapper=["env", "--default-signal"])
+    result = ctl.run(
+        command[0], ready, patch, *command[1:], "--installer", interrupted, wrapper=["env", "--default-signal"]
+    )
     assert result.status == -signal.Signals[f"SIG{number}"], result
     assert (scratch / "extracted").exists()
     assert os.listdir(ready.path / "tmp") == []
@@ -221,8 +224,10 @@ def test_other_names_keep_the_old_content(ctl, ready, patch, program):
 
 
 @pytest.mark.needs_root
-@pytest.mark.parametrize("command", [["setfacl", "-m", "u:nobody:r"], ["setcap", "cap_net_raw+ep"],
-                                     ["setfattr", "-n", "user.note", "-v", "kept"]])
+@pytest.mark.parametrize(
+    "command",
+    [["setfacl", "-m", "u:nobody:r"], ["setcap", "cap_net_raw+ep"], ["setfattr", "-n", "user.note", "-v", "kept"]],
+)
 def test_attributes_lost(ctl, ready, patch, program, command):
     target = ready.write("lib/a", "old\n")
     subprocess.run([*command, target], check=True)
@@ -243,7 +248,8 @@ def test_registry_and_run_information_of_others(ctl, ready, patch):
 def test_runinfo_syntax(ctl, ready, patch, row):
     ready.run_info += row.format(host=os.uname().nodename) + "\n"
     assert found(check(ctl, ready, patch, "--no-report", status=0), "runinfo-syntax") == [
-        ("warning", "config/.ConfigData/RunInfo line 2")]
+        ("warning", "config/.ConfigData/RunInfo line 2")
+    ]
 
 
 def test_runinfo_without_a_separator(ctl, ready, patch):
@@ -255,7 +261,8 @@ def test_host_prefix(ctl, ready, patch):
     here = socket.gethostname().split(".")[0]
     ready.add_row("yn", os.getpid(), "one", host=f"{here}2")
     assert found(check(ctl, ready, patch, "--no-report"), "host-prefix") == [
-        ("warning", "config/.ConfigData/RunInfo line 2")]
+        ("warning", "config/.ConfigData/RunInfo line 2")
+    ]
     ready.run_info = "FIELDSEP=|\n"
     ready.add_row("yn", 1, "one", host=f"{here}.example")
     assert found(check(ctl, ready, patch, "--no-report"), "host-prefix") == []
@@ -280,8 +287,7 @@ def test_an_owner_whose_name_ps_cuts(ctl, ready, patch):
         sleeper = subprocess.Popen(["sleep", "60"], **identity(name))
         try:
             ready.add_row("yn", sleeper.pid, "one")
-            assert found(check(ctl, ready, patch, "--no-report", status=1), "owner-truncated") == [
-                ("error", "kyn one")]
+            assert found(check(ctl, ready, patch, "--no-report", status=1), "owner-truncated") == [("error", "kyn one")]
         finally:
             sleeper.kill()
             sleeper.wait()
@@ -319,7 +325,8 @@ def test_clock_behind(ctl, ready, write):
     future = time.time() + 7200
     os.utime(ready.path / "patchlogs/orvpatch.log", (future, future))
     assert found(check(ctl, ready, path, "--no-report", status=0), "clock-behind") == [
-        ("warning", "patchlogs/orvpatch.log")]
+        ("warning", "patchlogs/orvpatch.log")
+    ]
 
 
 def test_other_run(ctl, ready, patch, write, program):
@@ -347,8 +354,11 @@ def key(scratch):
     folder = scratch / "gnupg"
     folder.mkdir(mode=0o700)
     env = {**os.environ, "GNUPGHOME": str(folder)}
-    subprocess.run(["gpg", "--batch", "-q", "--passphrase", "", "--quick-gen-key", "maker@example", "ed25519", "sign"],
-                   env=env, check=True)
+    subprocess.run(
+        ["gpg", "--batch", "-q", "--passphrase", "", "--quick-gen-key", "maker@example", "ed25519", "sign"],
+        env=env,
+        check=True,
+    )
     keyring = scratch / "keyring.gpg"
     keyring.write_bytes(subprocess.run(["gpg", "--export"], env=env, check=True, stdout=subprocess.PIPE).stdout)
     yield env, keyring

@@ -98,17 +98,20 @@ def folder(tmp_path_factory):
 
 
 def ask(words, folder):
-    done = subprocess.run(words, cwd=folder, stdin=subprocess.DEVNULL, capture_output=True, text=True, timeout=30,
-                          check=False)
+    done = subprocess.run(
+        words, cwd=folder, stdin=subprocess.DEVNULL, capture_output=True, text=True, timeout=30, check=False
+    )
     assert done.stderr == ""
     return done.stdout.splitlines()
 
 
 def bash(line, folder):
     words = shlex.split(line) + ([""] if line.endswith(" ") else [])
-    script = ('source "$1"; shift; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); '
-              '_orvpatchctl orvpatchctl "${COMP_WORDS[COMP_CWORD]}" "${COMP_WORDS[COMP_CWORD-1]}"; '
-              '((${#COMPREPLY[@]} == 0)) || printf "%s\\n" "${COMPREPLY[@]}"')
+    script = (
+        'source "$1"; shift; COMP_WORDS=("$@"); COMP_CWORD=$(($# - 1)); '
+        '_orvpatchctl orvpatchctl "${COMP_WORDS[COMP_CWORD]}" "${COMP_WORDS[COMP_CWORD-1]}"; '
+        '((${#COMPREPLY[@]} == 0)) || printf "%s\\n" "${COMPREPLY[@]}"'
+    )
     return ask(["bash", "--norc", "-c", script, "bash", COMPLETIONS / FILES["bash"], *words], folder)
 
 
@@ -137,14 +140,23 @@ def test_commands_are_offered(shell, folder, description):
 @SHELLS
 @pytest.mark.parametrize("command", ("show", "status", "history", "log", "verify"))
 def test_options_of_a_command_are_offered(shell, command, folder, description):
-    assert names(shell(f"orvpatchctl {command} --", folder)) == {option["name"] for option in description[command]["options"]}
+    assert names(shell(f"orvpatchctl {command} --", folder)) == {
+        option["name"] for option in description[command]["options"]
+    }
 
 
 @SHELLS
-@pytest.mark.parametrize("line, expected", (
-    ("orvpatchctl status ", {"home"}), ("orvpatchctl status --json ho", {"home"}),
-    ("orvpatchctl log --color ", {"auto", "always", "never"}), ("orvpatchctl log --color al", {"always"}),
-    ("orvpatchctl show pa", {"patch.tar"}), ("orvpatchctl verify home pa", {"patch.tar"}),
-    ("orvpatchctl history --since ", set())))
+@pytest.mark.parametrize(
+    "line, expected",
+    (
+        ("orvpatchctl status ", {"home"}),
+        ("orvpatchctl status --json ho", {"home"}),
+        ("orvpatchctl log --color ", {"auto", "always", "never"}),
+        ("orvpatchctl log --color al", {"always"}),
+        ("orvpatchctl show pa", {"patch.tar"}),
+        ("orvpatchctl verify home pa", {"patch.tar"}),
+        ("orvpatchctl history --since ", set()),
+    ),
+)
 def test_values_are_offered_by_their_kind(shell, line, expected, folder):
     assert names(shell(line, folder)) == expected

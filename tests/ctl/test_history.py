@@ -24,10 +24,24 @@ def lines(home):
 def transaction(home):
     """transaction(id, started, ended, ...) writes the record of a transaction."""
 
-    def write(identifier, started="2026-03-09T14:00:00Z", ended="2026-03-09T14:10:00Z", *, products=("kyn",),
-              target="vema", verdict="applied", **more):
-        record = {"id": identifier, "started": started, "ended": ended, "verdict": verdict,
-                  "patches": [{"product": product, "target": target} for product in products], **more}
+    def write(
+        identifier,
+        started="2026-03-09T14:00:00Z",
+        ended="2026-03-09T14:10:00Z",
+        *,
+        products=("kyn",),
+        target="vema",
+        verdict="applied",
+        **more,
+    ):
+        record = {
+            "id": identifier,
+            "started": started,
+            "ended": ended,
+            "verdict": verdict,
+            "patches": [{"product": product, "target": target} for product in products],
+            **more,
+        }
         home.mkdir(f"patchlogs/transactions/{identifier}", 0o700)
         home.write(f"patchlogs/transactions/{identifier}/record.json", json.dumps(record), 0o600)
 
@@ -47,12 +61,23 @@ def test_what_the_installer_wrote(ctl, home, program, write):
     home.component("yn")
     patch = write(Patch("yn", level="06100001", name="a name | with a bar").file("bin/tool"))
     assert program.install(home, patch).status == 0
-    assert program.install(home, write(Patch("yn", fixpack="fp0009", level="06100002", name="bad")
-                                       .script("fail.sh", when="pre_patch", status=1))).status == 22
+    assert (
+        program.install(
+            home,
+            write(
+                Patch("yn", fixpack="fp0009", level="06100002", name="bad").script(
+                    "fail.sh", when="pre_patch", status=1
+                )
+            ),
+        ).status
+        == 22
+    )
     date = home.read("patchlogs/patches.hist").decode().splitlines()[5].split(" | ")[-1]
     records = ctl.document("history", home)["records"]
-    assert [(record["name"], record["result"]) for record in records] == [("a name | with a bar", "PASS"),
-                                                                          ("bad", "FAIL")]
+    assert [(record["name"], record["result"]) for record in records] == [
+        ("a name | with a bar", "PASS"),
+        ("bad", "FAIL"),
+    ]
     assert records[0]["product"] == "kyn"
     assert records[0]["platform"] == "lpp266"
     assert records[0]["target"] == "vema"
@@ -63,8 +88,12 @@ def test_what_the_installer_wrote(ctl, home, program, write):
 
 
 def test_filters(ctl, home, lines):
-    lines(line("a"), line("b", product="kox", result="FAIL", time="03/10/2026 00:00:00"),
-          line("c", product="KYN", result="FAIL", time="12/31/2026 23:59:59"), line("d", time=""))
+    lines(
+        line("a"),
+        line("b", product="kox", result="FAIL", time="03/10/2026 00:00:00"),
+        line("c", product="KYN", result="FAIL", time="12/31/2026 23:59:59"),
+        line("d", time=""),
+    )
     assert names(ctl, home) == ["a", "b", "c", "d"]
     assert names(ctl, home, "--failed") == ["b", "c"]
     assert names(ctl, home, "--product", "kyn") == ["a", "c", "d"]
@@ -89,13 +118,24 @@ def test_what_is_no_record_is_shown_with_its_line(ctl, home, lines):
 
 
 def test_the_transaction_that_made_the_attempt(ctl, home, lines, transaction):
-    lines(line("before", time="03/09/2026 13:59:59"), line("in it"), line("other product", product="kox"),
-          line("other target", target="vems"), line("after", time="03/09/2026 14:10:01"))
+    lines(
+        line("before", time="03/09/2026 13:59:59"),
+        line("in it"),
+        line("other product", product="kox"),
+        line("other target", target="vems"),
+        line("after", time="03/09/2026 14:10:01"),
+    )
     transaction("20260309T140000Z-1")
-    found = {record["name"]: record["transaction"]
-             for record in ctl.document("history", home, env={"TZ": "UTC0"})["records"]}
-    assert found == {"before": None, "in it": "20260309T140000Z-1", "other product": None, "other target": None,
-                     "after": None}
+    found = {
+        record["name"]: record["transaction"] for record in ctl.document("history", home, env={"TZ": "UTC0"})["records"]
+    }
+    assert found == {
+        "before": None,
+        "in it": "20260309T140000Z-1",
+        "other product": None,
+        "other target": None,
+        "after": None,
+    }
 
 
 def test_times_of_the_history_are_local(ctl, home, lines, transaction):
@@ -126,9 +166,19 @@ def test_what_was_taken_back(ctl, home, lines, transaction):
     assert b"PASS, undone" in ctl.run("history", home, env={"TZ": "UTC0"}).out
 
 
-@pytest.mark.parametrize("content", (b"", b"{", b"[]", b'{"id": 5}', b'{"id": "a", "started": "now"}', b"\xff\xfe",
-                                     b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": 7}',
-                                     b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": [0, {"product": 1}]}'))
+@pytest.mark.parametrize(
+    "content",
+    (
+        b"",
+        b"{",
+        b"[]",
+        b'{"id": 5}',
+        b'{"id": "a", "started": "now"}',
+        b"\xff\xfe",
+        b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": 7}',
+        b'{"id": "a", "started": "2026-03-09T14:00:00Z", "patches": [0, {"product": 1}]}',
+    ),
+)
 def test_a_damaged_record_is_passed_over(ctl, home, lines, content):
     lines(line("in it"))
     home.write("patchlogs/transactions/a/record.json", content)

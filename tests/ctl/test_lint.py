@@ -52,8 +52,13 @@ def test_the_descriptor_that_counts_is_the_last_one(ctl, patch_dir):
     assert ctl.document("lint", archive.file("patch.ini", descriptor()).write(patch_dir)) == NOTHING
 
 
-@pytest.mark.parametrize("text, where", [
-    (descriptor("[PreCommands]\n10_a.sh=1\n"), "patch.ini:10"), ("# comment\n\nstray\n" + descriptor(), "patch.ini:3")])
+@pytest.mark.parametrize(
+    "text, where",
+    [
+        (descriptor("[PreCommands]\n10_a.sh=1\n"), "patch.ini:10"),
+        ("# comment\n\nstray\n" + descriptor(), "patch.ini:3"),
+    ],
+)
 def test_a_finding_names_the_line(ctl, write, text, where):
     document = ctl.document("lint", write(Patch("ox", descriptor=text).file("bin/tool")), status=1)
     assert [finding["where"] for finding in document["findings"]] == [where]
@@ -89,7 +94,8 @@ def test_an_archive_with_no_patchs_name_is_found_in_a_directory(ctl, write, patc
     shutil.copy(good, patch_dir / "kox_vms_vema_fp0002.tar")
     document = ctl.document("lint", patch_dir, status=1)
     assert [(finding["rule"], finding["patch"]) for finding in document["findings"]] == [
-        ("name-grammar", "kox_vms_vema_fp0002.tar")]
+        ("name-grammar", "kox_vms_vema_fp0002.tar")
+    ]
 
 
 @pytest.mark.parametrize("suffix", [".bak", "~", ".asc", ".sha256"])
@@ -107,10 +113,16 @@ def test_a_checksum_list_that_fits_is_no_finding(ctl, write, patch_dir):
     assert ctl.run("lint", good.name, cwd=patch_dir).status == 0
 
 
-@pytest.mark.parametrize("words, said", [
-    ([], b"no patch was given"), (["--explain", "no-such-rule"], b"no such rule: no-such-rule"),
-    (["/nonexistent/x.tar"], b"cannot read /nonexistent/x.tar"), (["/dev/null"], b"no regular file: /dev/null"),
-    (["/proc/self/fd"], b"no patch in /proc/self/fd/")])
+@pytest.mark.parametrize(
+    "words, said",
+    [
+        ([], b"no patch was given"),
+        (["--explain", "no-such-rule"], b"no such rule: no-such-rule"),
+        (["/nonexistent/x.tar"], b"cannot read /nonexistent/x.tar"),
+        (["/dev/null"], b"no regular file: /dev/null"),
+        (["/proc/self/fd"], b"no patch in /proc/self/fd/"),
+    ],
+)
 def test_what_cannot_be_judged_is_status_2(ctl, words, said):
     result = ctl.run("lint", *words)
     assert (result.status, result.out) == (2, b"")
@@ -189,7 +201,9 @@ def test_an_interruption_leaves_no_folder_behind(ctl, write, scratch, number):
 def interrupted(ctl, path, folder, number):
     """Status and output of the command that gets the signal once tar has unpacked a file."""
     command = subprocess.Popen(
-        [*ctl.program.argv, "lint", path], env={"TMPDIR": str(folder)}, stdout=subprocess.PIPE,
+        [*ctl.program.argv, "lint", path],
+        env={"TMPDIR": str(folder)},
+        stdout=subprocess.PIPE,
         preexec_fn=lambda: signal.signal(number, signal.SIG_DFL),  # ignored where the tests run in the background
     )
     while command.poll() is None:

@@ -13,6 +13,7 @@ cases = pytest.mark.parametrize("case", CASES, ids=[f"{case.rule}-{number}" for 
 def rules(program):
     """The table of the program: name of a rule -> what --explain tells of it."""
     from conftest import Ctl  # pylint: disable=import-outside-toplevel
+
     table = json.loads(Ctl(program).run("lint", "--explain", "all", "--json").out)["rules"]
     return {rule["rule"]: rule for rule in table}
 

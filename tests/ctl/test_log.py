@@ -16,14 +16,31 @@ from support import Patch, parse_log
 
 LOG = "patchlogs/orvpatch.log"
 RULE = "=" * 78 + "\n"
-STEPS = ["initialize", "checkForActivePrograms", "checkPrereqs", "cleanUp", "extract", "runPrePatchScripts",
-         "stopDependents", "runPreScripts", "moveFiles", "updateProductEXEFiles", "runPostScripts",
-         "updatePatchVerFile", "startDependents", "startOSAgentIfNeeded", "updatePatchRegistry", "cleanUp"]
+STEPS = [
+    "initialize",
+    "checkForActivePrograms",
+    "checkPrereqs",
+    "cleanUp",
+    "extract",
+    "runPrePatchScripts",
+    "stopDependents",
+    "runPreScripts",
+    "moveFiles",
+    "updateProductEXEFiles",
+    "runPostScripts",
+    "updatePatchVerFile",
+    "startDependents",
+    "startOSAgentIfNeeded",
+    "updatePatchRegistry",
+    "cleanUp",
+]
 
 
 def header(user="root", pid=4711):
-    return (f"{RULE} ORV Patch Log File\n   System Name: host1\n   User Name:   {user}\n   Process ID:  {pid}\n"
-            f"   Build Date:  3/5/07 21:48:44\n{RULE}")
+    return (
+        f"{RULE} ORV Patch Log File\n   System Name: host1\n   User Name:   {user}\n   Process ID:  {pid}\n"
+        f"   Build Date:  3/5/07 21:48:44\n{RULE}"
+    )
 
 
 def line(text, clock="14:00:00", component="main", level="TRACE"):
@@ -31,8 +48,7 @@ def line(text, clock="14:00:00", component="main", level="TRACE"):
 
 
 def install_lines(path="/p/kyn_lpp266_vema_fp0002.tar"):
-    return "".join(line(f"arg[{place}]: {word}")
-                   for place, word in enumerate(("orvpatch", "-h", "/home", "-i", path)))
+    return "".join(line(f"arg[{place}]: {word}") for place, word in enumerate(("orvpatch", "-h", "/home", "-i", path)))
 
 
 def runs(ctl, home, *words):
@@ -63,8 +79,7 @@ def test_every_run_of_a_real_log(ctl, home, program, write):
     assert [run["pid"] for run in found] == [head.pid for head in log.headers]
     assert [run["user"] for run in found] == [head.user for head in log.headers]
     assert [run["lines"] for run in found] == [len(run.lines) for run in log.runs]
-    assert [run["errors"] for run in found] == [sum(entry.level == "ERROR" for entry in run.lines)
-                                                for run in log.runs]
+    assert [run["errors"] for run in found] == [sum(entry.level == "ERROR" for entry in run.lines) for run in log.runs]
     assert not any(run["mixed"] for run in found)
 
 
@@ -93,9 +108,9 @@ def test_steps_of_an_installation(ctl, home, program, write):
     assert ["wait.sh"] in commands
     assert {child["status"] for child in document["children"] if child["command"][0] in ("tar", "wait.sh")} == {0}
     messages = home.log().runs[0].lines
-    assert [(message["level"], message["component"], message["line"], message["text"])
-            for message in document["messages"]] == [
-                (entry.level.lower(), entry.component, entry.line, entry.message) for entry in messages]
+    assert [
+        (message["level"], message["component"], message["line"], message["text"]) for message in document["messages"]
+    ] == [(entry.level.lower(), entry.component, entry.line, entry.message) for entry in messages]
 
 
 def test_the_step_that_failed(ctl, home, program, write):
@@ -124,8 +139,16 @@ def test_steps_of_a_report(ctl, home, program, write):
     assert program.report(home, write(agent_patch())).status == 0
     document = ctl.document("log", home, "1")
     assert [step["step"] for step in document["steps"]] == [
-        "initialize", "checkForActivePrograms", "checkPrereqs", "cleanUp", "printDependentsList", "extract",
-        "listFiles", "listProductEXEFiles", "cleanUp"]
+        "initialize",
+        "checkForActivePrograms",
+        "checkPrereqs",
+        "cleanUp",
+        "printDependentsList",
+        "extract",
+        "listFiles",
+        "listProductEXEFiles",
+        "cleanUp",
+    ]
 
 
 def test_what_is_shown(ctl, home, program, write):
@@ -148,10 +171,31 @@ def test_what_is_shown(ctl, home, program, write):
 def test_the_list_on_a_terminal(ctl, home):
     home.write(LOG, header() + install_lines() + line("main = 0", "23:00:01") + header(pid=5) + line("x"))
     lines = ctl.run("log", home).out.decode().splitlines()
-    assert lines[0].split() == ["RUN", "DATE", "TIME", "USER", "PID", "ACTION", "STATUS", "ERRORS", "LINES", "REMARK",
-                                "PATH"]
-    assert lines[1].split() == ["1", "-", "14:00:00", "root", "4711", "install", "0", "0", "6",
-                                "/p/kyn_lpp266_vema_fp0002.tar"]
+    assert lines[0].split() == [
+        "RUN",
+        "DATE",
+        "TIME",
+        "USER",
+        "PID",
+        "ACTION",
+        "STATUS",
+        "ERRORS",
+        "LINES",
+        "REMARK",
+        "PATH",
+    ]
+    assert lines[1].split() == [
+        "1",
+        "-",
+        "14:00:00",
+        "root",
+        "4711",
+        "install",
+        "0",
+        "0",
+        "6",
+        "/p/kyn_lpp266_vema_fp0002.tar",
+    ]
     assert "did not end" in lines[2]
 
 
@@ -168,8 +212,13 @@ def test_it_changes_nothing(ctl, home, program, write):
 
 
 def test_seconds_over_midnight(ctl, home):
-    home.write(LOG, header() + line("PatchProcessor::extract() entry", "23:59:50", "patchprocessor")
-               + line("PatchProcessor::extract() = 1", "00:00:05", "patchprocessor") + line("main = 0", "00:00:06"))
+    home.write(
+        LOG,
+        header()
+        + line("PatchProcessor::extract() entry", "23:59:50", "patchprocessor")
+        + line("PatchProcessor::extract() = 1", "00:00:05", "patchprocessor")
+        + line("main = 0", "00:00:06"),
+    )
     document = ctl.document("log", home, "1")
     assert [step["seconds"] for step in document["steps"]] == [15]
     assert document["seconds"] == 16
@@ -211,10 +260,14 @@ def test_what_precedes_the_first_header_is_run_nought(ctl, home):
 def test_two_runs_at_the_same_time(ctl, home, program, patch_dir):
     for code in ("yn", "ox"):
         home.component(code)
-    paths = [Patch(code, level="06100001").file(f"bin/{code}").script("wait.sh", when="pre").write(patch_dir)
-             for code in ("yn", "ox")]
-    processes = [subprocess.Popen([*program.argv, "-h", str(home.path), "-i", str(path)], stdout=subprocess.DEVNULL)
-                 for path in paths]
+    paths = [
+        Patch(code, level="06100001").file(f"bin/{code}").script("wait.sh", when="pre").write(patch_dir)
+        for code in ("yn", "ox")
+    ]
+    processes = [
+        subprocess.Popen([*program.argv, "-h", str(home.path), "-i", str(path)], stdout=subprocess.DEVNULL)
+        for path in paths
+    ]
     assert [process.wait() for process in processes] == [0, 0]
     found = runs(ctl, home)
     assert sorted(run["pid"] for run in found) == sorted(process.pid for process in processes)
@@ -266,11 +319,17 @@ def test_a_log_that_is_no_file_cannot_be_judged(ctl, home):
 
 def test_control_characters_reach_no_terminal(ctl, home):
     evil = "\x1b]0;x\x07\x1b[2J\x00\r\x7f"
-    home.write(LOG, header(user=evil) + install_lines(evil) + line(evil, level="ERROR")
-               + line("PatchProcessor::extract() entry", component="patchprocessor")
-               + line("runCommand entry", component="process.cpp")
-               + line(f"cmdArray[0]: {evil}", component="process.cpp")
-               + line("runCommand exit", component="process.cpp") + line("main = 1"))
+    home.write(
+        LOG,
+        header(user=evil)
+        + install_lines(evil)
+        + line(evil, level="ERROR")
+        + line("PatchProcessor::extract() entry", component="patchprocessor")
+        + line("runCommand entry", component="process.cpp")
+        + line(f"cmdArray[0]: {evil}", component="process.cpp")
+        + line("runCommand exit", component="process.cpp")
+        + line("main = 1"),
+    )
     for words in ((), ("1",), ("--follow",)):
         out = ctl.run("log", home, *words).out
         assert not set(out) & (set(range(32)) - {10}) and 0x7F not in out
@@ -292,8 +351,16 @@ def test_a_line_of_a_megabyte(ctl, home):
 
 def test_random_bytes(ctl, home):
     chance = random.Random(12)
-    pieces = [header().encode(), line("main = 0").encode(), RULE.encode(), b"\n", b"\0", b"TRACE ", b"): ",
-              line("PatchProcessor::extract() entry", component="patchprocessor").encode()]
+    pieces = [
+        header().encode(),
+        line("main = 0").encode(),
+        RULE.encode(),
+        b"\n",
+        b"\0",
+        b"TRACE ",
+        b"): ",
+        line("PatchProcessor::extract() entry", component="patchprocessor").encode(),
+    ]
     for _ in range(15):
         home.write(LOG, b"".join(chance.choice([*pieces, chance.randbytes(40)]) for _ in range(60)))
         for run in runs(ctl, home):
@@ -303,9 +370,11 @@ def test_random_bytes(ctl, home):
 # --- large ---------------------------------------------------------------------------------------------
 
 # A child of a process that is small itself: a child's peak includes that of the process that started it.
-PEAK = ("import os,sys\npid = os.posix_spawn(sys.argv[2], sys.argv[2:], os.environ)\n"
-        "_, status, usage = os.wait4(pid, 0)\nopen(sys.argv[1], 'w').write(str(usage.ru_maxrss))\n"
-        "sys.exit(os.waitstatus_to_exitcode(status))\n")
+PEAK = (
+    "import os,sys\npid = os.posix_spawn(sys.argv[2], sys.argv[2:], os.environ)\n"
+    "_, status, usage = os.wait4(pid, 0)\nopen(sys.argv[1], 'w').write(str(usage.ru_maxrss))\n"
+    "sys.exit(os.waitstatus_to_exitcode(status))\n"
+)
 SMALL_RUN = header() + install_lines() + line("main = 30") * 1
 LARGE_RUN = header() + install_lines() + line("PatchProcessor::moveFile() entry" + "x" * 60) * 4000 + line("main = 0")
 
@@ -325,8 +394,7 @@ def test_memory_does_not_grow_with_the_log(ctl, home, scratch, run):
     for words in (["--json"], []):
         wrapper = [sys.executable, "-I", "-S", "-c", PEAK, str(scratch / "peak")]
         with open(scratch / "out", "wb") as out:
-            done = subprocess.run([*wrapper, *ctl.program.argv, "log", str(home.path), *words], stdout=out,
-                                  check=False)
+            done = subprocess.run([*wrapper, *ctl.program.argv, "log", str(home.path), *words], stdout=out, check=False)
         assert done.returncode == 0
         with open(scratch / "out", "rb") as out:
             assert sum(1 for _ in out) == count + (4 if words else 1)
@@ -349,8 +417,12 @@ def at_work(home, program, write):
         patch = agent_patch().file("bin/other").script("wait.sh", when="pre_patch")
         path = write(patch)
         repack(path, "wait.sh", script)
-        process = subprocess.Popen([*program.argv, "-h", str(home.path), "-i", str(path)], stdout=subprocess.DEVNULL,
-                                   stderr=subprocess.DEVNULL, start_new_session=True)
+        process = subprocess.Popen(
+            [*program.argv, "-h", str(home.path), "-i", str(path)],
+            stdout=subprocess.DEVNULL,
+            stderr=subprocess.DEVNULL,
+            start_new_session=True,
+        )
         started.append(process)
         until(lambda: home.exists(LOG) and b"cmdArray[0]: wait.sh" in home.read(LOG))
         return process
@@ -386,8 +458,7 @@ def follower(ctl, home, scratch):
 
     def start(*words):
         with open(scratch / "follower.out", "wb") as out:
-            process = subprocess.Popen([*ctl.program.argv, "log", str(home.path), "--follow", *words],
-                                       stdout=out)
+            process = subprocess.Popen([*ctl.program.argv, "log", str(home.path), "--follow", *words], stdout=out)
         process.out = scratch / "follower.out"
         started.append(process)
         return process

@@ -9,8 +9,11 @@ import pytest
 @pytest.mark.parametrize("form", ((), ("--json",)), ids=("text", "json"))
 def test_output_that_cannot_be_written_is_no_success(ctl, home, words, form):
     rule = "=" * 78
-    home.write("patchlogs/orvpatch.log", f"{rule}\n ORV Patch Log File\n   System Name: host1\n   User Name:   root\n"
-               f"   Process ID:  1\n   Build Date:  3/5/07 21:48:44\n{rule}\n")
+    home.write(
+        "patchlogs/orvpatch.log",
+        f"{rule}\n ORV Patch Log File\n   System Name: host1\n   User Name:   root\n"
+        f"   Process ID:  1\n   Build Date:  3/5/07 21:48:44\n{rule}\n",
+    )
     if words == ("--help",):
         command = [str(ctl.program.binary), *words]
     else:
@@ -24,12 +27,21 @@ def test_output_that_cannot_be_written_is_no_success(ctl, home, words, form):
 def test_what_is_installed(ctl, scratch):
     build = ctl.program.binary.parent
     for component in ("ctl", "ctl-site", "ctl-debian"):
-        subprocess.run(["cmake", "--install", build, "--component", component, "--prefix", scratch], check=True,
-                       stdout=subprocess.DEVNULL)
-    expected = {"sbin/orvpatchctl", "share/bash-completion/completions/orvpatchctl", "share/man/man8/orvpatchctl.8.gz",
-                "share/fish/vendor_completions.d/orvpatchctl.fish", "share/zsh/site-functions/_orvpatchctl",
-                "share/zsh/vendor-completions/_orvpatchctl", "share/doc/orvpatchctl/schema/status.json",
-                "share/doc/orvpatchctl/copyright"}
+        subprocess.run(
+            ["cmake", "--install", build, "--component", component, "--prefix", scratch],
+            check=True,
+            stdout=subprocess.DEVNULL,
+        )
+    expected = {
+        "sbin/orvpatchctl",
+        "share/bash-completion/completions/orvpatchctl",
+        "share/man/man8/orvpatchctl.8.gz",
+        "share/fish/vendor_completions.d/orvpatchctl.fish",
+        "share/zsh/site-functions/_orvpatchctl",
+        "share/zsh/vendor-completions/_orvpatchctl",
+        "share/doc/orvpatchctl/schema/status.json",
+        "share/doc/orvpatchctl/copyright",
+    }
     installed = {str(path.relative_to(scratch)) for path in scratch.rglob("*") if path.is_file()}
     assert expected <= installed
     assert not [path for path in installed if path.endswith("/orvpatch")]

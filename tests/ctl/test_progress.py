@@ -30,8 +30,10 @@ def ready_fixture(home):
 @pytest.fixture(name="large")
 def large_fixture(write):
     # In the home of a test that watches, the command waits until the test has seen that it runs.
-    waits = ('[ ! -e "$quill_home/watched" ] || for _ in $(seq 3000); do [ ! -e "$quill_home/seen" ] || break; '
-             "sleep 0.02; done")
+    waits = (
+        '[ ! -e "$quill_home/watched" ] || for _ in $(seq 3000); do [ ! -e "$quill_home/seen" ] || break; '
+        "sleep 0.02; done"
+    )
     patch = Patch("yn").script("slow.sh", when="post", body=waits)
     for number in range(FILES):
         patch.file(f"lib/file{number:04}", "new\n")
@@ -44,9 +46,9 @@ def on_terminal(ctl, *words, columns=100, until=None):
     ours, theirs = pty.openpty()
     ioctl(theirs, termios.TIOCSWINSZ, struct.pack("HHHH", 24, columns, 0, 0))
     began = time.monotonic()
-    with tempfile.TemporaryFile() as printed, \
-            subprocess.Popen([*ctl.program.argv, *map(os.fspath, words)], stdin=subprocess.DEVNULL,
-                             stdout=printed, stderr=theirs) as process:
+    with tempfile.TemporaryFile() as printed, subprocess.Popen(
+        [*ctl.program.argv, *map(os.fspath, words)], stdin=subprocess.DEVNULL, stdout=printed, stderr=theirs
+    ) as process:
         os.close(theirs)
         shown = []
         while True:
@@ -99,7 +101,7 @@ def test_a_line_a_step_elsewhere(ctl, ready, large):
     assert f"install: {large.name}: moveFiles" in lines
     inside = [line.rsplit(": ", 1)[1] for line in lines if line.startswith(f"install: {large.name}: ")]
     begin = inside.index("runPrePatchScripts")
-    assert inside[begin:begin + 4] == ["runPrePatchScripts", "stopDependents", "runPreScripts", "moveFiles"]
+    assert inside[begin : begin + 4] == ["runPrePatchScripts", "stopDependents", "runPreScripts", "moveFiles"]
 
 
 def test_nothing_beside_a_document(ctl, ready, large):
@@ -110,8 +112,9 @@ def test_nothing_beside_a_document(ctl, ready, large):
 def test_a_log_that_cannot_be_followed_ends_nothing(ctl, program, ready, large, scratch):
     installer = scratch / "installer"
     log = ready.path / "patchlogs/orvpatch.log"
-    installer.write_text(f'#!/bin/sh\ncase $3 in -i) rm -f "{log}"; mkdir "{log}"; sleep 1;; esac\n'
-                         f'exec "{program.binary}" "$@"\n')
+    installer.write_text(
+        f'#!/bin/sh\ncase $3 in -i) rm -f "{log}"; mkdir "{log}"; sleep 1;; esac\n' f'exec "{program.binary}" "$@"\n'
+    )
     installer.chmod(0o755)
     result = ctl.run("apply", ready, large, "--yes", "--installer", installer)
     assert result.status == 0, result

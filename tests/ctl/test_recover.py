@@ -53,8 +53,11 @@ def expected(home, patches):
             elif state == "history-missing":
                 found.add((state, "patchlogs/patches.hist"))
             elif state == "directory-closed":
-                found |= {(state, place) for place in facts.directories
-                          if home.exists(place) and mode_of(home, place) != 0o777}
+                found |= {
+                    (state, place)
+                    for place in facts.directories
+                    if home.exists(place) and mode_of(home, place) != 0o777
+                }
             elif state.startswith("file-"):
                 found |= {(state, place) for place in files_in(home, facts, state)}
             else:
@@ -89,8 +92,11 @@ def attributes_of(home, place):
 def neighbours(home, place):
     """Mode, owner and group that most of the files beside it have, of several the least; nothing without any."""
     folder = (home.path / place).parent
-    found = Counter(attributes_of(home, path.relative_to(home.path)) for path in folder.iterdir()
-                    if path.is_file() and path.name != os.path.basename(place))
+    found = Counter(
+        attributes_of(home, path.relative_to(home.path))
+        for path in folder.iterdir()
+        if path.is_file() and path.name != os.path.basename(place)
+    )
     return min(found, key=lambda attributes: (-found[attributes], attributes)) if found else None
 
 
@@ -154,8 +160,9 @@ def test_a_killed_transaction_is_told_and_fixed_by_its_record(bench, ctl, state,
             if name in ("file-missing", "file-twice", "file-attributes"):
                 owner = REPLACED_OWNER if os.geteuid() == 0 else (os.geteuid(), os.getegid())
                 known = any(path in facts.replaced for facts in bench.scenario.patches)
-                assert attributes_of(home, path) == ((REPLACED_MODE, *owner) if known else
-                                                     (0o755, *attributes_of(home, path)[1:]))
+                assert attributes_of(home, path) == (
+                    (REPLACED_MODE, *owner) if known else (0o755, *attributes_of(home, path)[1:])
+                )
             elif name == "directory-closed":
                 assert mode_of(home, path) == mode_of(home, ".")
         assert home.instances() == running
@@ -171,8 +178,10 @@ def test_a_killed_transaction_is_told_and_fixed_by_its_record(bench, ctl, state,
 def kill_both(ctl, bench, home, kill, scratch):
     """orvpatchctl is killed as soon as it runs the installer, and the installer before the call."""
     installer, end = scratch / "installer", scratch / "end"
-    installer.write_text(f'#!/bin/sh\ncase $3 in -t) exec "{bench.program.binary}" "$@";; esac\nkill -9 $PPID\n'
-                         f'strace -o /dev/null -e {kill.expression} "{bench.program.binary}" "$@"\n: >"{end}"\n')
+    installer.write_text(
+        f'#!/bin/sh\ncase $3 in -t) exec "{bench.program.binary}" "$@";; esac\nkill -9 $PPID\n'
+        f'strace -o /dev/null -e {kill.expression} "{bench.program.binary}" "$@"\n: >"{end}"\n'
+    )
     installer.chmod(0o755)
     result = ctl.run("apply", home, bench.path, "--yes", "--installer", installer)
     assert result.status == -signal.SIGKILL, result
@@ -209,8 +218,7 @@ def test_a_run_that_ended_with_an_error(ctl, ready, program, write):
     patch = Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n").script("no.sh", when="post", status=1)
     assert program.run("-h", ready, "-i", write(patch)).status == 23
     document = ctl.document("recover", ready, status=1)
-    wanted = {("level-old", "registry/ynlpp266.ver"), ("instances-stopped", "kyn north"),
-              ("temporary-left", "tmp/kyn")}
+    wanted = {("level-old", "registry/ynlpp266.ver"), ("instances-stopped", "kyn north"), ("temporary-left", "tmp/kyn")}
     assert told(document) == wanted
     assert document["installer"]["status"] == 23
     assert unfixed(ctl.document("recover", ready, "--fix", status=1)) == {"level-old"}
@@ -242,7 +250,9 @@ def test_a_level_that_was_read_before_a_patch_is_not_its_level(ctl, ready, progr
     ready.write("registry/oxlpp266.ver", "")
     document = ctl.document("recover", ready, "--fix", status=1)
     assert [(state["path"], state["fixed"]) for state in document["states"]] == [
-        ("registry/oxlpp266.ver", True), ("registry/ynlpp266.ver", False)]
+        ("registry/oxlpp266.ver", True),
+        ("registry/ynlpp266.ver", False),
+    ]
     assert ready.level("ox") == OLD_LEVEL
 
 
@@ -311,14 +321,16 @@ def test_a_patch_file_that_has_gone_is_told(ctl, ready, program, write):
     document = ctl.document("recover", ready, status=1)
     assert document["states"] == []
     assert document["messages"] == [
-        f"{path.name}: the patch file cannot be read: its files and its level are not judged"]
+        f"{path.name}: the patch file cannot be read: its files and its level are not judged"
+    ]
 
 
 def test_the_terminal_gets_a_table(ctl, ready):
     ready.write("vmaorv6/agentdepot/rc.txt", "")
     assert ctl.run("recover", ready).out.decode().splitlines()[1:] == [
         "STATE              PATH                       REMEDY",
-        "result-file-empty  vmaorv6/agentdepot/rc.txt  recover --fix"]
+        "result-file-empty  vmaorv6/agentdepot/rc.txt  recover --fix",
+    ]
 
 
 @pytest.mark.parametrize("level", ["06.10.00.02", "06.10.00", "061000", "06100002"])
@@ -382,12 +394,15 @@ def test_a_line_of_an_earlier_installation_is_not_this_ones(ctl, ready, program,
 
 
 def test_a_run_that_was_killed_behind_its_line_has_it(ctl, ready, program, write):
-    killed_at(program, ready, write(Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n")), "fsync",
-              "patchlogs/patches.hist")
+    killed_at(
+        program, ready, write(Patch("yn", level=NEW_LEVEL).file("lib/a", "new\n")), "fsync", "patchlogs/patches.hist"
+    )
     assert [line.result for line in ready.history()] == ["PASS"]
     assert b"updatePatchRegistry() exit" not in ready.read("patchlogs/orvpatch.log")
     assert told(ctl.document("recover", ready, status=1)) == {
-        ("applied", "registry/ynlpp266.ver"), ("temporary-left", "tmp/kyn")}
+        ("applied", "registry/ynlpp266.ver"),
+        ("temporary-left", "tmp/kyn"),
+    }
 
 
 def test_a_patch_makes_the_level_of_its_own_version_file_alone_unknown(ctl, ready, program, write):
@@ -416,8 +431,13 @@ def faulty(*options):
 def test_a_version_file_that_cannot_be_put_on_disk_stays_empty(ctl, ready, program, write):
     assert program.run("-h", ready, "-t", write(Patch("yn").file("lib/a", "new\n"))).status == 0
     ready.write("registry/ynlpp266.ver", "")
-    document = ctl.document("recover", ready, "--fix", status=1, wrapper=faulty(
-        "-P", ready.path / "registry/ynlpp266.ver", "-e", "inject=fsync:error=EIO"))
+    document = ctl.document(
+        "recover",
+        ready,
+        "--fix",
+        status=1,
+        wrapper=faulty("-P", ready.path / "registry/ynlpp266.ver", "-e", "inject=fsync:error=EIO"),
+    )
     assert unfixed(document) == {"level-empty"}
     assert ready.read("registry/ynlpp266.ver") == b""
     assert ("level-empty", "registry/ynlpp266.ver") in told(ctl.document("recover", ready, status=1))
@@ -426,8 +446,9 @@ def test_a_version_file_that_cannot_be_put_on_disk_stays_empty(ctl, ready, progr
 def test_neighbours_that_cannot_be_listed_are_not_taken_for_none(ctl, ready, program, write):
     ready.write("lib/b", "old\n", 0o710)
     killed_at(program, ready, write(Patch("yn").file("lib/a", "new\n")), "link")
-    result = ctl.run("recover", ready, "--fix", wrapper=faulty(
-        "-P", ready.path / "lib", "-e", "inject=getdents64:error=EIO"))
+    result = ctl.run(
+        "recover", ready, "--fix", wrapper=faulty("-P", ready.path / "lib", "-e", "inject=getdents64:error=EIO")
+    )
     assert (result.status, ready.exists("lib/a")) == (2, False)
     assert b"cannot read" in result.err
     assert ("file-missing", "lib/a") in told(ctl.document("recover", ready, "--fix", status=1))
@@ -437,10 +458,20 @@ def test_neighbours_that_cannot_be_listed_are_not_taken_for_none(ctl, ready, pro
 @pytest.mark.parametrize("number", ["SIGINT", "SIGTERM", "SIGHUP"])
 def test_no_interruption_ends_the_fixing(ctl, ready, number):
     ready.write("vmaorv6/agentdepot/rc.txt", "")
-    document = ctl.document("recover", ready, "--fix", wrapper=["env", "--default-signal", *faulty(
-        "-P", ready.path / "vmaorv6/agentdepot/rc.txt", "-e", f"inject=fsync:signal={number}:when=1")])
+    document = ctl.document(
+        "recover",
+        ready,
+        "--fix",
+        wrapper=[
+            "env",
+            "--default-signal",
+            *faulty("-P", ready.path / "vmaorv6/agentdepot/rc.txt", "-e", f"inject=fsync:signal={number}:when=1"),
+        ],
+    )
     assert (document["states"], ready.read("vmaorv6/agentdepot/rc.txt")) == (
-        [{"state": "result-file-empty", "path": "vmaorv6/agentdepot/rc.txt", "fixed": True}], b"0")
+        [{"state": "result-file-empty", "path": "vmaorv6/agentdepot/rc.txt", "fixed": True}],
+        b"0",
+    )
 
 
 def test_directories_that_cannot_be_opened_are_told_once_each(ctl, bench, scratch):
@@ -463,4 +494,5 @@ def test_what_could_not_be_fixed_is_not_given_the_same_remedy(ctl, ready):
     ready.write("registry/ynlpp266.ver", "")
     assert ctl.run("recover", ready, "--fix").out.decode().splitlines()[2:] == [
         "level-empty  registry/ynlpp266.ver  see the messages",
-        "registry/ynlpp266.ver: neither record nor log tell what it held"]
+        "registry/ynlpp266.ver: neither record nor log tell what it held",
+    ]

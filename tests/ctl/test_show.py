@@ -50,9 +50,12 @@ class RandomPatch:
     def info(self):
         level = self.draw.choice([["06", "10", "00", "02"], ["06", "10", "1", "0"], ["0612", "10", "00", "ab"]])
         values = {
-            "productCode": self.spelled(self.code), "patchName": self.draw.choice(["fix", "a fix # 1", "x=y"]),
+            "productCode": self.spelled(self.code),
+            "patchName": self.draw.choice(["fix", "a fix # 1", "x=y"]),
             "patchDescriptiveName": self.draw.choice(["Fix pack", "100 % of it", '"quoted"']),
-            **dict(zip(["productVer", "productRel", "productMod", "productLvl"], level)), "productBinArch": "lpp266"}
+            **dict(zip(["productVer", "productRel", "productMod", "productLvl"], level)),
+            "productBinArch": "lpp266",
+        }
         if self.draw.random() < 0.15:
             values.pop(self.draw.choice(list(values)))
         lines = [f"{key}{self.draw.choice(['=', ' = '])}{value}" for key, value in values.items()]
@@ -83,26 +86,39 @@ def block(lines, heading):
     """The indented lines below a heading."""
     if heading not in lines:
         return []
-    below = lines[lines.index(heading) + 1:]
-    return [line[4:] for line in below[:next(at for at, line in enumerate(below) if not line.startswith("    "))]]
+    below = lines[lines.index(heading) + 1 :]
+    return [line[4:] for line in below[: next(at for at, line in enumerate(below) if not line.startswith("    "))]]
 
 
 def told_dependents(messages, product):
     """As the report looks for them: all, or one by one, and the patch's own product last."""
     if "Processing ALL active instances" in messages:
         return ["all"]
-    looked_for = [found[1] for message in messages if (found := re.fullmatch(
-        "(?:No running instances of|Dependent product not found:) ([^ ]*)(?: found)?", message))]
+    looked_for = [
+        found[1]
+        for message in messages
+        if (
+            found := re.fullmatch(
+                "(?:No running instances of|Dependent product not found:) ([^ ]*)(?: found)?", message
+            )
+        )
+    ]
     assert looked_for.pop() == product
     return looked_for
 
 
 def told_prerequisites(messages, product):
     """The product's own level is verified in another way, and not told."""
-    codes = [message.removeprefix("Check for prereq for ") for message in messages
-             if message.startswith("Check for prereq for ")]
-    levels = [found[1] for message in messages if (
-        found := re.fullmatch(f"Comparing installed version {HIGHEST} to required version (.*)\\.", message))]
+    codes = [
+        message.removeprefix("Check for prereq for ")
+        for message in messages
+        if message.startswith("Check for prereq for ")
+    ]
+    levels = [
+        found[1]
+        for message in messages
+        if (found := re.fullmatch(f"Comparing installed version {HIGHEST} to required version (.*)\\.", message))
+    ]
     return dict(zip([code for code in codes if code != product], levels)), codes
 
 
@@ -138,16 +154,24 @@ def test_it_agrees_with_the_installer(ctl, home, program, write, seed):
     assert told_dependents(messages, shown["product"]) == shown["dependents"]
     levels, codes = told_prerequisites(messages, shown["product"])
     assert [entry["product"] for entry in shown["prerequisites"]] == codes
-    assert {entry["product"]: undotted(entry["level"]) for entry in shown["prerequisites"]
-            if entry["product"] != shown["product"]} == levels
+    assert {
+        entry["product"]: undotted(entry["level"])
+        for entry in shown["prerequisites"]
+        if entry["product"] != shown["product"]
+    } == levels
 
     assert program.install(home, path).status == 0
     record = home.history()[-1]
     assert (record.product, record.arch, record.comp, record.name) == (
-        shown["product"], shown["platform"], shown["target"], shown["name"])
+        shown["product"],
+        shown["platform"],
+        shown["target"],
+        shown["name"],
+    )
     assert home.level(made.code) == undotted(shown["level"])
     assert [call.program for call in home.journal()] == [
-        command for when in ("prePatch", "pre", "post") for command in shown["commands"][when]]
+        command for when in ("prePatch", "pre", "post") for command in shown["commands"][when]
+    ]
     for file in shown["files"]:
         assert len(home.read(file["path"])) == file["size"]
 
@@ -166,13 +190,24 @@ def test_a_directory_of_one_patch_is_a_list(ctl, write, patch_dir):
 
 
 def test_a_terminal_gets_the_same(ctl, write):
-    path = write(Patch("yn", prereqs={"ox": "06.10.00"}, dependents=["um"]).file("bin/tool").script("10.sh", when="pre"))
+    path = write(
+        Patch("yn", prereqs={"ox": "06.10.00"}, dependents=["um"]).file("bin/tool").script("10.sh", when="pre")
+    )
     lines = ctl.run("show", path).out.decode().splitlines()
     assert lines[0] == path.name
     assert {line[2:16].strip(): line[18:] for line in lines[1:-1]} == {
-        "Product": "kyn on lpp266", "Kind": "vema, agent", "Name": "kyn_fp0001", "Description": "Fix pack fp0001 for kyn",
-        "Level": "06.10.01.00", "Prerequisites": "kox from 06.10.00.00", "Dependents": "kum", "Before stops": "none",
-        "Before files": "10.sh", "Before starts": "none", "Files": "1, 4 bytes"}
+        "Product": "kyn on lpp266",
+        "Kind": "vema, agent",
+        "Name": "kyn_fp0001",
+        "Description": "Fix pack fp0001 for kyn",
+        "Level": "06.10.01.00",
+        "Prerequisites": "kox from 06.10.00.00",
+        "Dependents": "kum",
+        "Before stops": "none",
+        "Before files": "10.sh",
+        "Before starts": "none",
+        "Files": "1, 4 bytes",
+    }
     assert lines[-1].split() == ["0644", "4", "bin/tool"]
 
 
@@ -182,4 +217,7 @@ def test_what_is_no_patch_cannot_be_shown(ctl, patch_dir, content):
     path.write_bytes(content)
     result = ctl.run("show", path)
     assert (result.status, result.out, result.err) == (
-        2, b"", b"orvpatchctl: " + path.name.encode() + b": no member patch.ini\n")
+        2,
+        b"",
+        b"orvpatchctl: " + path.name.encode() + b": no member patch.ini\n",
+    )

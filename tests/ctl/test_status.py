@@ -26,11 +26,23 @@ def test_every_kind_of_component(ctl, home):
     assert document["home"] == home.prefix
     assert document["leftovers"] == []
     assert set(components(document)) == {
-        ("kyn", "agent", "lpp266"), ("kyn", "monitoring-server", "vms"), ("kqa", "monitoring-server", "lpp266"),
-        ("kpt", "portal-server", "lpp266"), ("kdk", "desktop-client", "lpp266"), ("kzt", "cli", "lpp266")}
+        ("kyn", "agent", "lpp266"),
+        ("kyn", "monitoring-server", "vms"),
+        ("kqa", "monitoring-server", "lpp266"),
+        ("kpt", "portal-server", "lpp266"),
+        ("kdk", "desktop-client", "lpp266"),
+        ("kzt", "cli", "lpp266"),
+    }
     agent = components(document)["kyn", "agent", "lpp266"]
-    assert agent == {"code": "kyn", "name": "Product yn", "kind": "agent", "level": "06.10.00.02",
-                     "platform": "lpp266", "instances": [], "lastPatch": None}
+    assert agent == {
+        "code": "kyn",
+        "name": "Product yn",
+        "kind": "agent",
+        "level": "06.10.00.02",
+        "platform": "lpp266",
+        "instances": [],
+        "lastPatch": None,
+    }
 
 
 def test_two_architectures_of_a_product_are_two_components(ctl, home):
@@ -52,7 +64,8 @@ def test_instances_of_agent_and_server(ctl, home):
     found = component(ctl, home)
     assert sorted(found["instances"], key=lambda instance: instance["name"]) == [
         {"name": "", "pid": home.pid("yn"), "user": USER},
-        {"name": "east", "pid": home.pid("yn", "east"), "user": USER}]
+        {"name": "east", "pid": home.pid("yn", "east"), "user": USER},
+    ]
     assert [instance["pid"] for instance in component(ctl, home, "kqa")["instances"]] == [home.pid("qa")]
 
 
@@ -68,8 +81,12 @@ def test_instances_of_several_owners(ctl, home):
 @pytest.mark.parametrize("number", (1, 30, 300))
 def test_many_components(ctl, home, number):
     letters = "abcdefghijklmnopqrstuvwxyz"
-    codes = sorted(f"{first}{second}" for first in letters for second in letters
-                   if f"{first}{second}" not in ("qa", "pt", "dk", "zt"))[:number]
+    codes = sorted(
+        f"{first}{second}"
+        for first in letters
+        for second in letters
+        if f"{first}{second}" not in ("qa", "pt", "dk", "zt")
+    )[:number]
     for code in codes:
         home.component(code)
     home.start(codes[-1])
@@ -85,8 +102,11 @@ def test_the_last_patch_is_that_of_the_component(ctl, home, program, write):
     good = write(Patch("yn", fixpack="fp0001", level="06100001", name="first").file("bin/tool"))
     assert program.install(home, good).status == 0
     assert component(ctl, home)["lastPatch"]["result"] == "PASS"
-    bad = write(Patch("yn", fixpack="fp0002", level="06100002", name="second").file("bin/tool")
-                .script("fail.sh", when="pre", status=3))
+    bad = write(
+        Patch("yn", fixpack="fp0002", level="06100002", name="second")
+        .file("bin/tool")
+        .script("fail.sh", when="pre", status=3)
+    )
     assert program.install(home, bad).status == 21
     last = component(ctl, home)["lastPatch"]
     assert last == {"name": "second", "result": "FAIL", "time": home.history()[-1].date}
@@ -96,11 +116,17 @@ def test_the_last_patch_is_that_of_the_component(ctl, home, program, write):
 def test_a_patch_of_another_kind_or_architecture_is_not_the_component_s(ctl, home):
     home.component("yn")
     home.component("zt")
-    home.write("patchlogs/patches.hist", "".join(
-        f"{product} | {arch} | {target} | {name:20} | PASS | root            | 03/09/2026 14:05:00\n"
-        for product, arch, target, name in (
-            ("kyn", "lpp268", "vema", "other arch"), ("kyn", "lpp266", "vems", "server's"),
-            ("kyn", "lpp266", "vecm", "command line"))))
+    home.write(
+        "patchlogs/patches.hist",
+        "".join(
+            f"{product} | {arch} | {target} | {name:20} | PASS | root            | 03/09/2026 14:05:00\n"
+            for product, arch, target, name in (
+                ("kyn", "lpp268", "vema", "other arch"),
+                ("kyn", "lpp266", "vems", "server's"),
+                ("kyn", "lpp266", "vecm", "command line"),
+            )
+        ),
+    )
     assert component(ctl, home)["lastPatch"] is None
     assert component(ctl, home, "kzt")["lastPatch"]["name"] == "command line"
 

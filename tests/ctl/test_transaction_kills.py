@@ -15,8 +15,26 @@ from callfaults import SEED, outlived
 from oracle import assert_taken_back, listing
 from support import Patch, ProductHome
 
-CHANGING = ("link", "linkat", "rename", "unlink", "unlinkat", "mkdir", "rmdir", "openat", "write", "fchmod", "fchown",
-            "fchmodat", "chmod", "chown", "ftruncate", "fsync", "syncfs", "utimensat")
+CHANGING = (
+    "link",
+    "linkat",
+    "rename",
+    "unlink",
+    "unlinkat",
+    "mkdir",
+    "rmdir",
+    "openat",
+    "write",
+    "fchmod",
+    "fchown",
+    "fchmodat",
+    "chmod",
+    "chown",
+    "ftruncate",
+    "fsync",
+    "syncfs",
+    "utimensat",
+)
 SAMPLE = None if os.environ.get("ORVPATCH_FAULTS") == "all" else 6
 _CALL = re.compile(r"^(\w+)\(")
 pytestmark = pytest.mark.usefixtures("seed")
@@ -90,14 +108,27 @@ def test_apply_is_killed(bench):
 def test_the_installer_is_killed(bench, program, scratch):
     """The installation ends in its middle, and its caller lives on."""
     installer = scratch / "killed"
-    calls = [(name, ordinal) for name, most in (("link", 3), ("unlink", 6), ("fchmod", 6), ("write", 120), ("mkdir", 4),
-                                                ("rmdir", 3), ("ftruncate", 1)) for ordinal in range(1, most + 1)]
+    calls = [
+        (name, ordinal)
+        for name, most in (
+            ("link", 3),
+            ("unlink", 6),
+            ("fchmod", 6),
+            ("write", 120),
+            ("mkdir", 4),
+            ("rmdir", 3),
+            ("ftruncate", 1),
+        )
+        for ordinal in range(1, most + 1)
+    ]
     for name, ordinal in chosen(calls):
         with bench.home() as home:
             before = listing(home)
-            installer.write_text(f'#!/bin/sh\ncase $3 in -t) exec "{program.binary}" "$@";; esac\n'
-                                 f'exec strace -o /dev/null -e trace={name} '
-                                 f'-e inject={name}:signal=SIGKILL:when={ordinal} "{program.binary}" "$@"\n')
+            installer.write_text(
+                f'#!/bin/sh\ncase $3 in -t) exec "{program.binary}" "$@";; esac\n'
+                f"exec strace -o /dev/null -e trace={name} "
+                f'-e inject={name}:signal=SIGKILL:when={ordinal} "{program.binary}" "$@"\n'
+            )
             installer.chmod(0o755)
             result = bench.run("apply", home, bench.patch, "--yes", "--installer", installer)
             assert result.status in (0, 3, 4), (name, ordinal, result)

@@ -48,8 +48,9 @@ def test_a_good_installation_has_no_difference(ctl, home, install, write):
     assert ctl.document("verify", home, path)["files"] == 6
 
 
-@pytest.mark.parametrize("target, code", [("vema", "ox"), ("vems", "qa"), ("veps", "pt"), ("vepd", "dk"),
-                                          ("vecm", "zt")])
+@pytest.mark.parametrize(
+    "target, code", [("vema", "ox"), ("vems", "qa"), ("veps", "pt"), ("vepd", "dk"), ("vecm", "zt")]
+)
 def test_each_target_verifies_after_its_installation(ctl, home, install, write, target, code):
     home.component(code)
     path = install(write(Patch(code, target=target).file(f"bin/{code}")))
@@ -102,7 +103,7 @@ def test_a_cut_archive_itself_cannot_be_judged(ctl, home, install, write):
 def test_a_tar_that_is_killed_half_way_is_found(ctl, home, install, write, scratch):
     """A child that a signal ends counts as a success."""
     home.component("yn")
-    half = "/usr/bin/tar \"$@\"; case $# in 2) rm updated_files/lib/d updated_files/lib/e; kill -9 $$;; esac"
+    half = '/usr/bin/tar "$@"; case $# in 2) rm updated_files/lib/d updated_files/lib/e; kill -9 $$;; esac'
     path = stubs(scratch / "stubs", tar=half)
     patch = install(write(patch_of_five()), env={"PATH": path})
     assert differences(ctl, home, patch) == [("lib/d", "missing"), ("lib/e", "missing")]
@@ -200,8 +201,7 @@ def test_level_and_history_are_compared(ctl, home, install, write):
     path = install(write(Patch("yn").file("lib/a")))
     home.component("yn", "06100000")
     home.write("patchlogs/patches.hist", b"")
-    assert differences(ctl, home, path) == [("registry/ynlpp266.ver", "level"),
-                                            ("patchlogs/patches.hist", "history")]
+    assert differences(ctl, home, path) == [("registry/ynlpp266.ver", "level"), ("patchlogs/patches.hist", "history")]
     home.write("registry/ynlpp266.ver", "desc = x\n")
     assert ("registry/ynlpp266.ver", "level") in differences(ctl, home, path)
 
@@ -223,8 +223,9 @@ def test_of_two_patches_in_a_directory_the_later_one_decides(ctl, home, program,
     assert differences(ctl, home, patch_dir) == []
 
 
-@pytest.mark.parametrize("what, reason", [("home", b"ORV home"), ("patch", b"cannot read"), ("garbage", b".tar"),
-                                          ("foreign", b"applies")])
+@pytest.mark.parametrize(
+    "what, reason", [("home", b"ORV home"), ("patch", b"cannot read"), ("garbage", b".tar"), ("foreign", b"applies")]
+)
 def test_what_cannot_be_judged_is_status_2(ctl, home, write, scratch, what, reason):
     home.component("yn")
     path = write(Patch("yn").file("lib/a"))

@@ -91,11 +91,19 @@ def open_to_all(path):
     path.chmod(0o777)
 
 
-@pytest.mark.parametrize("change, path, kind", [
-    (remove, "lib/new", "missing"), (remove, "lib/replaced", "missing"), (make_directory, "lib/new", "type"),
-    (overwrite, "fresh/deep/file", "content"), (same_content_in_another_file, "lib/new", "content"),
-    (open_to_all, "lib/new", "mode"), (open_to_all, "lib/replaced", "mode")], ids=lambda value: getattr(
-        value, "__name__", None))
+@pytest.mark.parametrize(
+    "change, path, kind",
+    [
+        (remove, "lib/new", "missing"),
+        (remove, "lib/replaced", "missing"),
+        (make_directory, "lib/new", "type"),
+        (overwrite, "fresh/deep/file", "content"),
+        (same_content_in_another_file, "lib/new", "content"),
+        (open_to_all, "lib/new", "mode"),
+        (open_to_all, "lib/replaced", "mode"),
+    ],
+    ids=lambda value: getattr(value, "__name__", None),
+)
 def test_a_change_of_a_file_is_named(ctl, ready, applied, change, path, kind):
     change(ready.path / path)
     assert differences(ctl, ready, applied) == [(path, kind)]
@@ -118,8 +126,12 @@ def test_a_missing_directory_level_history_and_instance_are_named(ctl, ready, ap
     (ready.path / "patchlogs/patches.hist").write_text("")
     ready.stop("yn", "north")
     assert sorted(differences(ctl, ready, applied)) == [
-        ("fresh/deep", "missing"), ("fresh/deep/file", "missing"), ("kyn north", "instance"),
-        ("patchlogs/patches.hist", "history"), (f"registry/{version.name}", "level")]
+        ("fresh/deep", "missing"),
+        ("fresh/deep/file", "missing"),
+        ("kyn north", "instance"),
+        ("patchlogs/patches.hist", "history"),
+        (f"registry/{version.name}", "level"),
+    ]
 
 
 def test_what_the_installation_did_not_bring_is_named(ctl, ready, write):

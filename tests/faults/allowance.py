@@ -10,8 +10,12 @@ _COMMANDS = ("PROC_CANT_RUN", "PROC_BAD_RC", "ERROR_PP_SET_CWD")
 _STARTS = {12: ("ERROR_START_AGENT",), 13: ("ERROR_START_INST",), 20: ("ERROR_START_CANT_SU",)}
 ENDS = {
     "start": {2: ("ERROR_ORV_HOME",)},
-    "load": {30: ("ERROR_DCFPP_PATH",), 31: ("ERROR_DCFPP_NO_FILES",), 32: ("ERROR_DCFPP_NO_APPLICABLE",),
-             34: ("ERROR_DCFPP_NOT_APPLICABLE",)},
+    "load": {
+        30: ("ERROR_DCFPP_PATH",),
+        31: ("ERROR_DCFPP_NO_FILES",),
+        32: ("ERROR_DCFPP_NO_APPLICABLE",),
+        34: ("ERROR_DCFPP_NOT_APPLICABLE",),
+    },
     "initialize": {**_TARS, 32: ("ERROR_DCFPP_NO_APPLICABLE",)},
     "descriptor": {5: ("ERROR_INIFILE_CANT_READ",), 32: ("ERROR_DCFPP_NO_APPLICABLE",)},
     "registry": {9: ("ERROR_PP_MISSING_PROD", "ERROR_PP_MISSING_PREREQ"), 32: ("ERROR_DCFPP_NO_APPLICABLE",)},
@@ -30,9 +34,9 @@ LOADING = ("start", "load", "initialize", "descriptor", "registry")
 
 # What a failure may change in silence, step by step.
 _SILENT = {
-    "load": {"left out"},               # a patch that cannot be seen is none
-    "initialize": {"directory"},        # the working directory is not the one of the start any more
-    "registry": {"unseen"},             # an instance that is not seen is neither stopped nor started
+    "load": {"left out"},  # a patch that cannot be seen is none
+    "initialize": {"directory"},  # the working directory is not the one of the start any more
+    "registry": {"unseen"},  # an instance that is not seen is neither stopped nor started
     "clean-up": {"leftover"},
     "extract": {"directory"},
     "pre_patch": {"directory"},
@@ -77,15 +81,17 @@ class Allowance:
 
     def touches(self, place, context_roots):
         """Whether a fault of the walk struck at this place under the home, or above it, or at none at all."""
-        return any(self._touches(fault, place, context_roots) for fault in self.faults
-                   if fault.step in ("move", "list"))
+        return any(
+            self._touches(fault, place, context_roots) for fault in self.faults if fault.step in ("move", "list")
+        )
 
     @staticmethod
     def _touches(fault, place, roots):
         if not fault.path.startswith("/"):
             return True
-        struck = next((fault.path[len(root):].strip("/") for root in roots
-                       if f"{fault.path}/".startswith(root + "/")), None)
+        struck = next(
+            (fault.path[len(root) :].strip("/") for root in roots if f"{fault.path}/".startswith(root + "/")), None
+        )
         if struck is None:
             return False
         return struck == "" or place == struck or place.startswith(struck + "/")

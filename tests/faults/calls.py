@@ -9,14 +9,16 @@ from typing import NamedTuple
 
 class Kind(NamedTuple):
     names: str
-    errors: str       # in the conditions that hosts get into: closed permissions, files gone, full or broken disks
+    errors: str  # in the conditions that hosts get into: closed permissions, files gone, full or broken disks
     changes: bool = False  # whether such a call may change the home
 
 
 KINDS = {
-    "look": Kind("access faccessat faccessat2 stat lstat fstat newfstatat statx fstatfs statfs readlink readlinkat "
-                 "llistxattr",
-                 "EACCES ENOENT EIO ENOMEM"),
+    "look": Kind(
+        "access faccessat faccessat2 stat lstat fstat newfstatat statx fstatfs statfs readlink readlinkat "
+        "llistxattr",
+        "EACCES ENOENT EIO ENOMEM",
+    ),
     "open": Kind("open openat openat2", "EACCES ENOENT EIO EMFILE EINTR ENOMEM"),
     "list": Kind("getdents getdents64", "EIO ENOENT ENOMEM"),
     "read": Kind("read readv pread64", "EIO EINTR"),
@@ -27,10 +29,16 @@ KINDS = {
     "close": Kind("close", "EIO EINTR ENOSPC"),
     "make": Kind("mkdir mkdirat", "EACCES ENOENT ENOSPC EIO EMLINK EPERM EROFS ENOMEM", changes=True),
     "remove": Kind("unlink unlinkat rmdir", "EACCES EIO EPERM EROFS", changes=True),
-    "link": Kind("link linkat rename renameat renameat2",
-                 "EACCES ENOENT ENOSPC EIO EXDEV EMLINK EPERM EROFS ENOMEM", changes=True),
-    "attributes": Kind("chmod fchmod fchmodat fchmodat2 chown fchown lchown fchownat utimensat",
-                       "EACCES EPERM EROFS EIO ENOENT", changes=True),
+    "link": Kind(
+        "link linkat rename renameat renameat2",
+        "EACCES ENOENT ENOSPC EIO EXDEV EMLINK EPERM EROFS ENOMEM",
+        changes=True,
+    ),
+    "attributes": Kind(
+        "chmod fchmod fchmodat fchmodat2 chown fchown lchown fchownat utimensat",
+        "EACCES EPERM EROFS EIO ENOENT",
+        changes=True,
+    ),
     "enter": Kind("chdir fchdir", "EACCES ENOENT EIO ENOMEM"),
     "where": Kind("getcwd", "EACCES ENOENT ENOMEM"),
     "child": Kind("clone clone3 fork vfork", "EAGAIN ENOMEM", changes=True),
@@ -45,9 +53,12 @@ KINDS = {
     "socket": Kind("socket connect", "EACCES EMFILE ENOMEM"),
     "host": Kind("uname", "EPERM"),
     # With the arguments that the program gives them these cannot fail.
-    "infallible": Kind("exit_group getpid getppid getuid geteuid getgid getegid munmap rt_sigaction rt_sigprocmask "
-                       "rt_sigreturn kill umask time clock_gettime clock_nanosleep prlimit64 getrandom setsid madvise "
-                       "mprotect futex sysinfo restart_syscall", ""),
+    "infallible": Kind(
+        "exit_group getpid getppid getuid geteuid getgid getegid munmap rt_sigaction rt_sigprocmask "
+        "rt_sigreturn kill umask time clock_gettime clock_nanosleep prlimit64 getrandom setsid madvise "
+        "mprotect futex sysinfo restart_syscall",
+        "",
+    ),
 }
 _KIND_OF = {name: kind for kind, facts in KINDS.items() for name in facts.names.split()}
 _FLAGS_OF_WRITING = ("O_WRONLY", "O_RDWR", "O_CREAT")

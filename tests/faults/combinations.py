@@ -42,8 +42,11 @@ class Child:
 def _tar(chance):
     call, error, last = chance.choice(_TAR)
     inject = f"inject={call}:error={error}:when={chance.randint(1, last)}"
-    return Child(f"tar with {inject}", ("initialize", "descriptor", "extract"),
-                 stub={"tar": f'exec strace -o /dev/null -e {inject} /bin/tar "$@"'})
+    return Child(
+        f"tar with {inject}",
+        ("initialize", "descriptor", "extract"),
+        stub={"tar": f'exec strace -o /dev/null -e {inject} /bin/tar "$@"'},
+    )
 
 
 def _ps(chance):

@@ -48,8 +48,7 @@ class Choice:
     def of(self, kind, top, faults, count):
         """Those to take of `faults`, of which a sample has `count`; their names begin with `top`."""
         if self.only:
-            asked = {name for name in self.only
-                     if _KINDS[name.count(":") + 1] == kind and name.split(":")[0] == top}
+            asked = {name for name in self.only if _KINDS[name.count(":") + 1] == kind and name.split(":")[0] == top}
             known = {str(fault) for fault in faults}
             assert asked <= known, f"ORVPATCH_FAULTS_ONLY: there is no fault of the name {asked - known}"
             return [fault for fault in faults if str(fault) in asked]

@@ -49,14 +49,22 @@ class Injection(NamedTuple):
 
 def injections_of(scenario, calls, spared_calls):
     """Every injection into a run that makes `calls`, or `spared_calls` when the log has to be spared."""
-    return [injection for made, spared in ((calls, False), (spared_calls, True))
-            for injection in _injections(scenario, made) if injection.spares_the_log == spared]
+    return [
+        injection
+        for made, spared in ((calls, False), (spared_calls, True))
+        for injection in _injections(scenario, made)
+        if injection.spares_the_log == spared
+    ]
 
 
 def _injections(scenario, calls):
-    return [Injection(scenario, call.name, call.ordinal, error, mode)
-            for call in calls if not call.is_log and KINDS[call.kind].errors
-            for error in errors_of(call) for mode in modes_of(call)]
+    return [
+        Injection(scenario, call.name, call.ordinal, error, mode)
+        for call in calls
+        if not call.is_log and KINDS[call.kind].errors
+        for error in errors_of(call)
+        for mode in modes_of(call)
+    ]
 
 
 def modes_of(call):

@@ -9,15 +9,19 @@ from datetime import datetime, timedelta
 from support.catalogue import TEXTS, text
 
 from .allowance import ENDS, LOADING
-from .scenario import (EXTRACTED_MODE, NEW_LEVEL, NEW_MODE, OLD_LEVEL, REPLACED_MODE, REPLACED_OWNER, old_content)
+from .scenario import EXTRACTED_MODE, NEW_LEVEL, NEW_MODE, OLD_LEVEL, REPLACED_MODE, REPLACED_OWNER, old_content
 
 HISTORY, LOG, RESULT_FILE = "patchlogs/patches.hist", "patchlogs/orvpatch.log", "vmaorv6/agentdepot/rc.txt"
 _RUN_INFO = "config/.ConfigData/RunInfo"
-_HISTORY_HEADER = ["#" * 80, "# Norvik Veyra Monitoring Patch History File", "#",
-                   "# Format: <Product Code> | <Architecture> | <Comp> | <Patch Name> | PASS/FAIL | <user> | <date>",
-                   "#" * 80]
+_HISTORY_HEADER = [
+    "#" * 80,
+    "# Norvik Veyra Monitoring Patch History File",
+    "#",
+    "# Format: <Product Code> | <Architecture> | <Comp> | <Patch Name> | PASS/FAIL | <user> | <date>",
+    "#" * 80,
+]
 _OPENED, _CLOSED = 0o777, (0o755, 0o700)
-_BAD_HOME = 2          # the run ends before it has a log
+_BAD_HOME = 2  # the run ends before it has a log
 _LEFTOVER_STATUS = 27  # of a clean-up that failed: it ends nothing, but is what the OS agent is told
 
 
@@ -36,8 +40,11 @@ class _Judgement:
     def problems(self):
         yield from self._status()
         if self.status == _BAD_HOME:
-            yield from _compare("output", (b"", (text("ERROR_ORV_HOME", self.home.prefix) + "\n").encode()),
-                                (self.run.result.out, self.run.result.err))
+            yield from _compare(
+                "output",
+                (b"", (text("ERROR_ORV_HOME", self.home.prefix) + "\n").encode()),
+                (self.run.result.out, self.run.result.err),
+            )
         else:
             yield from self._streams()
             yield from self._log() if "log" not in self.allowed else ()
@@ -100,8 +107,11 @@ class _Judgement:
     # --- what it said --------------------------------------------------------------------------------------
 
     def _streams(self):
-        verdict = (f"\n{text('MAIN_SUCCESSFUL')}\n\n" if self.status == 0 else
-                   f"\n{text('MAIN_NOT_SUCCESSFUL', self.home.prefix + 'patchlogs/')}\n\n")
+        verdict = (
+            f"\n{text('MAIN_SUCCESSFUL')}\n\n"
+            if self.status == 0
+            else f"\n{text('MAIN_NOT_SUCCESSFUL', self.home.prefix + 'patchlogs/')}\n\n"
+        )
         out, err = self.run.result.out.decode(), self.run.result.err.decode()
         if "out" not in self.allowed and not self.run.debug:
             yield from self._standard_output(out, verdict)
@@ -178,10 +188,12 @@ class _Judgement:
 
     def _records(self):
         """The lines of the history but for their dates."""
-        return [f"{facts.code} | {facts.patch.platform} | {facts.patch.target} | {facts.patch.name:20} | "
-                f"{'PASS' if self.story.passed(index) else 'FAIL'} | {_user():15} | "
-                for index, facts in enumerate(self.scenario.patches)
-                if index in self.story.applied and self.scenario.action == "-i"]
+        return [
+            f"{facts.code} | {facts.patch.platform} | {facts.patch.target} | {facts.patch.name:20} | "
+            f"{'PASS' if self.story.passed(index) else 'FAIL'} | {_user():15} | "
+            for index, facts in enumerate(self.scenario.patches)
+            if index in self.story.applied and self.scenario.action == "-i"
+        ]
 
     # --- what it called ------------------------------------------------------------------------------------
 
@@ -191,9 +203,9 @@ class _Judgement:
         for index in self.story.applied:
             for step, wanted in self.run.calls_of(index):
                 made = [words for words in rest if words in wanted]
-                if rest[:len(made)] != made or not self._is_enough(index, step, made, wanted):
+                if rest[: len(made)] != made or not self._is_enough(index, step, made, wanted):
                     yield f"calls of {step}: expected {wanted}, found {rest}"
-                rest = rest[len(made):]
+                rest = rest[len(made) :]
         yield from _compare("further calls", [], rest)
         for call in journal:
             yield from self._call(call)
@@ -207,11 +219,13 @@ class _Judgement:
             done = self.story.failed_step(index, "-i") != step
         if "unseen" in self.allowed and step == "stop":
             return not done or made == [words for words in wanted if words in made]
-        return made == wanted if done else made == wanted[:len(made)]
+        return made == wanted if done else made == wanted[: len(made)]
 
     def _call(self, call):
-        temp = next((facts.temp for facts in self.scenario.patches
-                     if call.program in sum(facts.patch.commands.values(), [])), None)
+        temp = next(
+            (facts.temp for facts in self.scenario.patches if call.program in sum(facts.patch.commands.values(), [])),
+            None,
+        )
         folder = f"{self.home.path}/{temp}" if temp else str(self.run.bench.start)
         search = self.run.search_path
         yield from _compare(f"PATH of {call}", f"{folder}:{search}" if temp else search, call.path)
@@ -266,8 +280,12 @@ class _Judgement:
 
     def _is_kept(self, entry, facts, place):
         """A place that the walk did not get to see, with its new file still waiting."""
-        return _is_old(entry, facts, place) and f"{facts.temp}/updated_files/{place}" in self.tree or \
-            _is_old(entry, facts, place) and self.story.passed(self.scenario.patches.index(facts))
+        return (
+            _is_old(entry, facts, place)
+            and f"{facts.temp}/updated_files/{place}" in self.tree
+            or _is_old(entry, facts, place)
+            and self.story.passed(self.scenario.patches.index(facts))
+        )
 
     def _level(self, index, facts):
         old = self.run.before[facts.version_file].content
@@ -285,8 +303,9 @@ class _Judgement:
         before, entry = self.run.before.get(RESULT_FILE), self.tree.get(RESULT_FILE)
         wanted = {before.content if before else None}
         for index in self.story.applied:
-            if ("start", "ox") in [call[-2:] for step, calls in self.run.calls_of(index) for call in calls
-                                   if step == "osagent"]:
+            if ("start", "ox") in [
+                call[-2:] for step, calls in self.run.calls_of(index) for call in calls if step == "osagent"
+            ]:
                 wanted = {str(status).encode() for status in self._told(index)}
         if "result file" in self.allowed:
             wanted |= {None, b""}
@@ -303,7 +322,7 @@ class _Judgement:
 
     def _temporary(self, index, facts):
         top, members = facts.temp, self.run.bench.members[index]
-        found = {path[len(top) + 1:]: entry for path, entry in self.tree.items() if path.startswith(top + "/")}
+        found = {path[len(top) + 1 :]: entry for path, entry in self.tree.items() if path.startswith(top + "/")}
         extracted = self.story.extracted(index)
         damaged = "leftover" in self.allowed or self.failed_at and self.failed_at[1] in ("extract", "loading")
         for path, entry in found.items():
@@ -334,9 +353,17 @@ class _Judgement:
             yield from _compare(path, wanted.get(path), found.get(path))
 
     def _untouched(self, tree):
-        own = {HISTORY, LOG, RESULT_FILE, _RUN_INFO, *(
-            place for facts in self.scenario.patches
-            for place in (*facts.replaced, *facts.added, *facts.directories, facts.version_file, facts.temp))}
+        own = {
+            HISTORY,
+            LOG,
+            RESULT_FILE,
+            _RUN_INFO,
+            *(
+                place
+                for facts in self.scenario.patches
+                for place in (*facts.replaced, *facts.added, *facts.directories, facts.version_file, facts.temp)
+            ),
+        }
         temps = tuple(f"{facts.temp}/" for facts in self.scenario.patches)
         return {path: entry for path, entry in tree.items() if path not in own and not path.startswith(temps)}
 
@@ -357,8 +384,12 @@ def _is_new(entry, facts, place, exact):
 def _is_old(entry, facts, place):
     if place in facts.added:
         return entry is None
-    return entry is not None and entry.content == old_content(place) and entry.mode == REPLACED_MODE and \
-        (os.geteuid() != 0 or (entry.uid, entry.gid) == REPLACED_OWNER)
+    return (
+        entry is not None
+        and entry.content == old_content(place)
+        and entry.mode == REPLACED_MODE
+        and (os.geteuid() != 0 or (entry.uid, entry.gid) == REPLACED_OWNER)
+    )
 
 
 def _facts(entry):

@@ -61,8 +61,9 @@ def kills_of(bench):
     for call in run.calls:
         if _changes(call, context):
             path = os.path.normpath(call.paths[-1]) if call.paths else ""
-            kills.append(Kill(bench.scenario.name, call.name, call.ordinal, call.kind, context.step, context.patch,
-                              path))
+            kills.append(
+                Kill(bench.scenario.name, call.name, call.ordinal, call.kind, context.step, context.patch, path)
+            )
         context.after(call)
     return kills
 
@@ -92,8 +93,11 @@ def settle(home, seconds=30):
 def _children(home):
     started = set(map(int, home.read("control/started").split()))
     mark = f"\0QUILLHOME={home.prefix}\0".encode()
-    return [int(name) for name in os.listdir("/proc")
-            if name.isdigit() and int(name) not in started and mark in b"\0" + _read(name, "environ")]
+    return [
+        int(name)
+        for name in os.listdir("/proc")
+        if name.isdigit() and int(name) not in started and mark in b"\0" + _read(name, "environ")
+    ]
 
 
 def _read(pid, file):
@@ -124,5 +128,8 @@ def example(every_kill, state):
     """The last of the kills that its description fits."""
     step, kind, end = EXAMPLES[state]
     patch = max(kill.patch for kill in every_kill)
-    return [kill for kill in every_kill
-            if (kill.patch, kill.step, kill.kind) == (patch, step, kind) and kill.path.endswith(end)][-1]
+    return [
+        kill
+        for kill in every_kill
+        if (kill.patch, kill.step, kill.kind) == (patch, step, kind) and kill.path.endswith(end)
+    ][-1]

@@ -87,9 +87,16 @@ class Run:
     def again(self, faults, env=None, pid_file="/dev/null"):
         """The same command on the same home, with these faults; result and calls."""
         tell = ["/bin/sh", "-c", 'ulimit -c 0; echo $$ >"$0"; exec "$@"', str(pid_file)]
-        return traced(self.bench.program, self.bench.scenario.arguments(self.home, self.bench.path),
-                      self.bench.start, self.home.path.parent / "trace", faults, self.debug, env=env or {},
-                      wrapper=tell)
+        return traced(
+            self.bench.program,
+            self.bench.scenario.arguments(self.home, self.bench.path),
+            self.bench.start,
+            self.home.path.parent / "trace",
+            faults,
+            self.debug,
+            env=env or {},
+            wrapper=tell,
+        )
 
     def close(self):
         self.home.close()
@@ -150,9 +157,14 @@ class Run:
         os_agent = [("kox", "")] if ("kox", "") in made else []
         if self.bench.scenario.action == "-t":
             return []
-        return [("pre_patch", commands["pre_patch"]), ("stop", _controls("stop", stops)), ("pre", commands["pre"]),
-                ("post", commands["post"]), ("restart", _controls("start", starts)),
-                ("osagent", _controls("start", os_agent))]
+        return [
+            ("pre_patch", commands["pre_patch"]),
+            ("stop", _controls("stop", stops)),
+            ("pre", commands["pre"]),
+            ("post", commands["post"]),
+            ("restart", _controls("start", starts)),
+            ("osagent", _controls("start", os_agent)),
+        ]
 
     def _was_stopped(self, index, code, name):
         called = [(call.program, *call.args) for call in self.home.journal()]

@@ -15,11 +15,11 @@ _OWNER = (4711, 4712)
 
 class PatchFacts(NamedTuple):
     patch: Patch
-    replaced: tuple     # files under the home that the patch replaces
-    added: tuple        # files that it brings to a new place
+    replaced: tuple  # files under the home that the patch replaces
+    added: tuple  # files that it brings to a new place
     directories: tuple  # directories that it makes
-    failing: str = ""   # the step whose script fails: "pre_patch", "pre", "post", or none
-    status: int = 0     # that script's exit status
+    failing: str = ""  # the step whose script fails: "pre_patch", "pre", "post", or none
+    status: int = 0  # that script's exit status
 
     @property
     def code(self):
@@ -51,9 +51,16 @@ def _agent_patch(fail_status=0):
     patch = Patch("yn", level=NEW_LEVEL, prereqs={"ox": OLD_LEVEL}, dependents=["ox"])
     patch.script("10_check.sh", "pre_patch").script("20_save.sh", "pre").script("21_more.sh", "pre")
     patch.script("30_post.sh", "post", status=fail_status, out="some output", err="some error")
-    return _with_files(PatchFacts(
-        patch, ("bin/yn", "config/yn.conf"), ("bin/ynhelper", "lib/yn/deep/data"), ("lib", "lib/yn", "lib/yn/deep"),
-        "post" if fail_status else "", fail_status))
+    return _with_files(
+        PatchFacts(
+            patch,
+            ("bin/yn", "config/yn.conf"),
+            ("bin/ynhelper", "lib/yn/deep/data"),
+            ("lib", "lib/yn", "lib/yn/deep"),
+            "post" if fail_status else "",
+            fail_status,
+        )
+    )
 
 
 def _server_patch():
@@ -115,10 +122,13 @@ INSTALLED = ("kox", "kqa", "kyn")
 REPLACED_MODE, NEW_MODE, EXTRACTED_MODE = _OLD_MODE, 0o755, _ARCHIVE_MODE
 REPLACED_OWNER = _OWNER
 
-SCENARIOS = {scenario.name: scenario for scenario in (
-    Scenario("install", "-i", [_server_patch(), _agent_patch()], directory=True),
-    Scenario("report", "-t", [_agent_patch()], directory=False),
-    Scenario("failure", "-i", [_agent_patch(fail_status=3)], directory=False),
-)}
+SCENARIOS = {
+    scenario.name: scenario
+    for scenario in (
+        Scenario("install", "-i", [_server_patch(), _agent_patch()], directory=True),
+        Scenario("report", "-t", [_agent_patch()], directory=False),
+        Scenario("failure", "-i", [_agent_patch(fail_status=3)], directory=False),
+    )
+}
 # The patch of the failure once its command is right.
 REPAIRED = Scenario("repaired", "-i", [_agent_patch()], directory=False)

@@ -79,8 +79,12 @@ def lost_files(home, facts, repeated):
         whole = (old_content(place), facts.new_content(place))
         if entry is not None and entry.content not in whole:
             yield f"{place}: expected an old or a new one, found {entry.content!r}"
-        if entry is None and place in facts.replaced and not repeated and \
-                (waiting is None or waiting.content != facts.new_content(place)):
+        if (
+            entry is None
+            and place in facts.replaced
+            and not repeated
+            and (waiting is None or waiting.content != facts.new_content(place))
+        ):
             yield f"{place}: expected to wait under tmp, found {waiting}"
 
 
@@ -112,8 +116,9 @@ class Aftermath:
         return set().union(*(stopped(self.home, facts) for facts in self.patches))
 
     def _again(self):
-        return self.bench.program.run(*self.bench.scenario.arguments(self.home, self.bench.healing_path),
-                                      cwd=self.bench.start, timeout=60)
+        return self.bench.program.run(
+            *self.bench.scenario.arguments(self.home, self.bench.healing_path), cwd=self.bench.start, timeout=60
+        )
 
     def check_repetition(self):
         """The same command again does what the page says of the states."""

@@ -5,31 +5,37 @@ import re
 from typing import NamedTuple
 
 # Log message -> the step that begins with it. What follows the end of a step belongs to no step: "between".
-_STEPS = [(re.compile(pattern), step) for pattern, step in (
-    (r"DCFPackageProcessor::load\(\) entry", "load"),
-    (r"PatchProcessor::initialize\(\) entry", "initialize"),
-    (r"PatchProcessor::parsePatchDescriptor\(\) entry", "descriptor"),
-    (r"PatchProcessor::parsePatchDescriptor\(\) = ", "initialize"),
-    (r"PatchProcessor::initialize\(\) retval", "load"),
-    (r"ORVComponentRegistry::ORVComponentRegistry entry", "registry"),
-    (r"ORVComponentRegistry::ORVComponentRegistry exit", "load"),
-    (r"PatchProcessor::extract\(\) entry", "extract"),
-    (r"PatchProcessor::runPrePatchScripts\(\) entry", "pre_patch"),
-    (r"PatchProcessor::stopDependents\(\) entry", "stop"),
-    (r"PatchProcessor::runPreScripts\(\) entry", "pre"),
-    (r"PatchProcessor::moveFiles\(\) entry", "move"),
-    (r"PatchProcessor::updateProductEXEFiles\(\) entry", "between"),
-    (r"PatchProcessor::runPostScripts\(\) entry", "post"),
-    (r"PatchProcessor::updatePatchVerFile\(\) entry", "level"),
-    (r"PatchProcessor::startDependents\(\) entry", "restart"),
-    (r"PatchProcessor::startOSAgentIfNeeded\(\) entry", "osagent"),
-    (r"PatchProcessor::updatePatchRegistry\(\) entry", "history"),
-    (r"PatchProcessor::listFiles\(\) entry", "list"),
-    (r"PatchProcessor::cleanUp\(\) entry", "clean-up"),
-    (r"PatchProcessor::(extract|runPrePatchScripts|runPreScripts|runPostScripts|stopDependents|startDependents"
-     r"|startOSAgentIfNeeded|updatePatchVerFile|cleanUp|run|testRun)\(\) =? ?\d", "between"),
-    (r"PatchProcessor::(moveFile\(\) = |updatePatchRegistry\(\) exit|listFiles\(\) exit)", "between"),
-)]
+_STEPS = [
+    (re.compile(pattern), step)
+    for pattern, step in (
+        (r"DCFPackageProcessor::load\(\) entry", "load"),
+        (r"PatchProcessor::initialize\(\) entry", "initialize"),
+        (r"PatchProcessor::parsePatchDescriptor\(\) entry", "descriptor"),
+        (r"PatchProcessor::parsePatchDescriptor\(\) = ", "initialize"),
+        (r"PatchProcessor::initialize\(\) retval", "load"),
+        (r"ORVComponentRegistry::ORVComponentRegistry entry", "registry"),
+        (r"ORVComponentRegistry::ORVComponentRegistry exit", "load"),
+        (r"PatchProcessor::extract\(\) entry", "extract"),
+        (r"PatchProcessor::runPrePatchScripts\(\) entry", "pre_patch"),
+        (r"PatchProcessor::stopDependents\(\) entry", "stop"),
+        (r"PatchProcessor::runPreScripts\(\) entry", "pre"),
+        (r"PatchProcessor::moveFiles\(\) entry", "move"),
+        (r"PatchProcessor::updateProductEXEFiles\(\) entry", "between"),
+        (r"PatchProcessor::runPostScripts\(\) entry", "post"),
+        (r"PatchProcessor::updatePatchVerFile\(\) entry", "level"),
+        (r"PatchProcessor::startDependents\(\) entry", "restart"),
+        (r"PatchProcessor::startOSAgentIfNeeded\(\) entry", "osagent"),
+        (r"PatchProcessor::updatePatchRegistry\(\) entry", "history"),
+        (r"PatchProcessor::listFiles\(\) entry", "list"),
+        (r"PatchProcessor::cleanUp\(\) entry", "clean-up"),
+        (
+            r"PatchProcessor::(extract|runPrePatchScripts|runPreScripts|runPostScripts|stopDependents|startDependents"
+            r"|startOSAgentIfNeeded|updatePatchVerFile|cleanUp|run|testRun)\(\) =? ?\d",
+            "between",
+        ),
+        (r"PatchProcessor::(moveFile\(\) = |updatePatchRegistry\(\) exit|listFiles\(\) exit)", "between"),
+    )
+]
 _CANDIDATE = re.compile(r"DCFPackageProcessor::isApplicable\('.*','(.*)'\)  entry")
 _WORD = re.compile(r"cmdArray\[\d+\]: (.*)")
 
@@ -43,10 +49,10 @@ class Fault(NamedTuple):
     """A call that failed, without its name: where in the work and at what."""
 
     step: str
-    patch: int        # index in the scenario
-    path: str         # normalised; of a descriptor that which it stands for; "" without one
+    patch: int  # index in the scenario
+    path: str  # normalised; of a descriptor that which it stands for; "" without one
     error: str
-    command: tuple    # words of the child process that the call serves, or of the one that failed itself
+    command: tuple  # words of the child process that the call serves, or of the one that failed itself
     stream: str = ""  # "out" or "err" when the call prints
     in_log: bool = False
 

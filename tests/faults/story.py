@@ -5,8 +5,7 @@ import re
 from .steps import Context, step_after
 
 # The steps of an installation and of a report: each one only when all before it have succeeded.
-CHAIN = {"-i": ("extract", "pre_patch", "stop", "pre", "move", "post", "level", "restart"),
-         "-t": ("extract", "list")}
+CHAIN = {"-i": ("extract", "pre_patch", "stop", "pre", "move", "post", "level", "restart"), "-t": ("extract", "list")}
 _RESULT = re.compile(r"PatchProcessor::(run|testRun|startDependents|startOSAgentIfNeeded)\(\) = (\d)$")
 
 
@@ -57,7 +56,7 @@ class Story:
         return chain[-1]
 
     def contradictions(self, patch):
-        wanted = list(CHAIN[self.action][:len(self._chain(patch))])
+        wanted = list(CHAIN[self.action][: len(self._chain(patch))])
         if self.action == "-i":
             wanted += ["osagent", "history"]
             if self.passed(patch) != (self.failed_step(patch, "-i") is None):

@@ -17,8 +17,13 @@ OLD, NEW = b"old\n", b"new\n"
 
 
 def agent_patch(folder, code="yn", **options):
-    return (Patch(code, **options).file("bin/agent", NEW).file(f"lib/{code}/data", NEW)
-            .script("20_pre.sh", "pre").write(folder))
+    return (
+        Patch(code, **options)
+        .file("bin/agent", NEW)
+        .file(f"lib/{code}/data", NEW)
+        .script("20_pre.sh", "pre")
+        .write(folder)
+    )
 
 
 def with_agent(home, *codes):
@@ -40,8 +45,12 @@ def results(home):
 
 def outcome(home, code="yn"):
     """What became of the patch: content of the replaced and of the new file, level, history."""
-    return (home.read("bin/agent"), home.exists(f"lib/{code}/data") and home.read(f"lib/{code}/data"),
-            home.level(code), results(home))
+    return (
+        home.read("bin/agent"),
+        home.exists(f"lib/{code}/data") and home.read(f"lib/{code}/data"),
+        home.level(code),
+        results(home),
+    )
 
 
 UNTOUCHED = (OLD, False, "06100000")
@@ -83,8 +92,13 @@ def test_full_disk_before_the_extraction(program, scratch, patch_dir):
 def test_disk_that_fills_up_while_the_patch_is_applied(program, scratch, patch_dir):
     """The history line finds no room: that stops nothing, and nothing else is missing."""
     fill_once = '[ -e "$quill_home/filler" ] || cat /dev/zero >"$quill_home/filler" 2>/dev/null'
-    patch = (Patch("yn").file("bin/agent", NEW).file("lib/yn/data", NEW)
-             .script("30_post.sh", "post", body=fill_once).write(patch_dir))
+    patch = (
+        Patch("yn")
+        .file("bin/agent", NEW)
+        .file("lib/yn/data", NEW)
+        .script("30_post.sh", "post", body=fill_once)
+        .write(patch_dir)
+    )
     with small_disk(scratch / "disk", 512) as disk, with_agent(ProductHome(disk / "home")) as home:
         done = program.install(home, patch)
         assert (done.status, done.err) == (0, b"")
@@ -102,8 +116,7 @@ def test_read_only_home(program, agent_home, patch_dir, action):
     lost, _, rest = done.err.decode().rpartition(text("LOG_CANT_WRITE", f"{agent_home.path}/patchlogs/orvpatch.log"))
     assert done.status == 3
     assert text("ERROR_PP_MAKE_DIR", f"{agent_home.path}/tmp/kyn") in done.err.decode()
-    assert set(filter(None, lost.splitlines())) >= {text("LOG_CANT_WRITE",
-                                                         f"{agent_home.path}/patchlogs/orvpatch.log")}
+    assert set(filter(None, lost.splitlines())) >= {text("LOG_CANT_WRITE", f"{agent_home.path}/patchlogs/orvpatch.log")}
     assert rest == "\n"
     assert agent_home.tree() == before
 
@@ -293,9 +306,11 @@ def run_together(*runs):
 
 def meeting_patch(folder, code, other):
     """A patch whose command goes on only when the other patch's command runs too."""
-    wait = (f': >"$quill_home/{code}.here"\n'
-            f'n=0; until [ -e "$quill_home/{other}.here" ] || [ $n = 200 ]; do sleep 0.05; n=$((n + 1)); done')
-    return (Patch(code).file(f"bin/{code}", NEW).script("10_meet.sh", "pre_patch", body=wait).write(folder))
+    wait = (
+        f': >"$quill_home/{code}.here"\n'
+        f'n=0; until [ -e "$quill_home/{other}.here" ] || [ $n = 200 ]; do sleep 0.05; n=$((n + 1)); done'
+    )
+    return Patch(code).file(f"bin/{code}", NEW).script("10_meet.sh", "pre_patch", body=wait).write(folder)
 
 
 _LOG_LINE = re.compile(r"(ERROR|INFO |TRACE) \d\d:\d\d:\d\d \([^,()]*,\d+\): ")

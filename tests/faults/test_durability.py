@@ -35,15 +35,18 @@ def kinds(calls, step, end, among):
 def test_the_extracted_files_are_flushed_before_the_first_old_one_goes(calls):
     order = kinds(calls, "move", lambda _: "", ("flush", "remove", "link"))
     assert {code: made[0] for code, made in order.items()} == {"kqa": "flush", "kyn": "flush"}
-    flushed = [call.path for step, facts, call in calls
-               if (step, call.kind) == ("move", "flush") and call.path.endswith(f"{facts.temp}/updated_files")]
+    flushed = [
+        call.path
+        for step, facts, call in calls
+        if (step, call.kind) == ("move", "flush") and call.path.endswith(f"{facts.temp}/updated_files")
+    ]
     assert len(flushed) == 2
 
 
 def test_the_version_file_is_written_in_one_piece_and_flushed(calls):
     order = kinds(calls, "level", lambda facts: facts.version_file, ("open", "write", "flush", "close"))
     for code in ("kqa", "kyn"):
-        assert order[code][order[code].index("open to write"):] == ["open to write", "write", "flush", "close"]
+        assert order[code][order[code].index("open to write") :] == ["open to write", "write", "flush", "close"]
 
 
 def test_the_history_line_is_flushed(calls):

@@ -26,6 +26,7 @@ def replace(path, old, new):
         content = run.home.read(path)
         assert old in content
         run.home.write(path, content.replace(old, new, 1))
+
     return change
 
 

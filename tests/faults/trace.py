@@ -22,19 +22,19 @@ class Call(NamedTuple):
     """One system call of the program. Its paths are absolute; an open descriptor's path is the only one of
     a call that takes a descriptor."""
 
-    kind: str        # what the call is for, see calls.py
+    kind: str  # what the call is for, see calls.py
     name: str
-    ordinal: int     # among the calls of this name, the loader's included: what strace counts by
+    ordinal: int  # among the calls of this name, the loader's included: what strace counts by
     paths: tuple
-    given: tuple     # the paths as the program gave them
-    flags: str       # all arguments, to look for a flag
+    given: tuple  # the paths as the program gave them
+    flags: str  # all arguments, to look for a flag
     descriptor: int  # None for a call that takes no descriptor
-    text: str        # of a write: what is written
-    result: int      # None when the call did not return
-    error: str       # name of the error, empty on success
+    text: str  # of a write: what is written
+    result: int  # None when the call did not return
+    error: str  # name of the error, empty on success
     injected: bool
     messages: tuple  # log messages that this call writes
-    cwd: str         # the working directory at the call
+    cwd: str  # the working directory at the call
 
     @property
     def path(self):
@@ -79,9 +79,20 @@ def _call(match, ordinal, cwd):
     paths = tuple(os.path.join(top, text) for top, text in quoted) or given
     error = _ERROR.match(rest)
     return Call(
-        kind, name, ordinal, paths, given, arguments,
-        int(descriptor[1]) if descriptor else None, text, _number(result), error[1] if error else "",
-        rest.endswith("(INJECTED)"), tuple(_LOG_LINE.findall(text)), cwd)
+        kind,
+        name,
+        ordinal,
+        paths,
+        given,
+        arguments,
+        int(descriptor[1]) if descriptor else None,
+        text,
+        _number(result),
+        error[1] if error else "",
+        rest.endswith("(INJECTED)"),
+        tuple(_LOG_LINE.findall(text)),
+        cwd,
+    )
 
 
 def _number(result):

@@ -66,12 +66,7 @@ class Controller:
             words += ["--extra-vars", json.dumps(variables)]
         streams = {"stdin": subprocess.DEVNULL, "stdout": subprocess.PIPE, "stderr": subprocess.STDOUT}
         return subprocess.Popen(
-            words,
-            env=self._environment(),
-            cwd=self.folder,
-            text=True,
-            start_new_session=True,
-            **{**streams, **options},
+            words, env=self._environment(), cwd=self.folder, text=True, start_new_session=True, **{**streams, **options}
         )
 
     def run(self, program, *words, timeout=1200, **options):
@@ -102,9 +97,7 @@ class Controller:
         return printed
 
     def _environment(self):
-        kept = {
-            name: value for name, value in os.environ.items() if not name.startswith(("ANSIBLE_", "SSH_"))
-        }
+        kept = {name: value for name, value in os.environ.items() if not name.startswith(("ANSIBLE_", "SSH_"))}
         return {
             **kept,
             "HOME": str(self.folder / "home"),

@@ -22,9 +22,7 @@ class Modules:
 
     def start(self, name, check=False, diff=False, **options):
         """Starts a module; `answer` waits for its end."""
-        given = {
-            key: str(value) if isinstance(value, os.PathLike) else value for key, value in options.items()
-        }
+        given = {key: str(value) if isinstance(value, os.PathLike) else value for key, value in options.items()}
         if name in ("applied", "undone"):
             given.setdefault("state_dir", str(self.state))
         given = {**self.options, **given, "_ansible_check_mode": check, "_ansible_diff": diff}
@@ -33,11 +31,7 @@ class Modules:
         arguments.write_text(json.dumps({"ANSIBLE_MODULE_ARGS": given}))
         return subprocess.Popen(
             [sys.executable, "-m", f"ansible_collections.orv.patch.plugins.modules.{name}", arguments],
-            env={
-                **os.environ,
-                "PYTHONPATH": str(self.folder / "collections"),
-                "PYTHONDONTWRITEBYTECODE": "1",
-            },
+            env={**os.environ, "PYTHONPATH": str(self.folder / "collections"), "PYTHONDONTWRITEBYTECODE": "1"},
             stdin=subprocess.DEVNULL,
             stdout=subprocess.PIPE,
             stderr=subprocess.PIPE,

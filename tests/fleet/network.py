@@ -63,9 +63,7 @@ def why_not():
         return f"{', '.join(lacking)} missing: scripts/setup fleet"
     if os.geteuid() != 0:
         return "network namespaces need root"
-    script = (
-        "ip link add one type bridge && ip link add two type veth peer name three && mount -t tmpfs none /run"
-    )
+    script = "ip link add one type bridge && ip link add two type veth peer name three && mount -t tmpfs none /run"
     tried = subprocess.run(
         ["unshare", "--net", "--mount", "--pid", "--fork", "--uts", "sh", "-c", script],
         capture_output=True,
@@ -175,20 +173,7 @@ class Host:
         self._plug_in()
 
     def _plug_in(self):
-        plug = (
-            "ip",
-            "link",
-            "add",
-            self.link,
-            "master",
-            "fleet",
-            "type",
-            "veth",
-            "peer",
-            "name",
-            "eth0",
-            "netns",
-        )
+        plug = ("ip", "link", "add", self.link, "master", "fleet", "type", "veth", "peer", "name", "eth0", "netns")
         while not self._has_own_network():
             time.sleep(0.01)
         self.fleet.on_switch(*plug, f"/proc/{self.space.pid}/ns/net")
@@ -222,9 +207,7 @@ class Host:
         for folder in Path(f"/proc/{self.space.pid}/root/proc").iterdir():
             if folder.name.isdecimal():
                 try:
-                    found[int(folder.name)] = (
-                        (folder / "cmdline").read_bytes().replace(b"\0", b" ").decode().strip()
-                    )
+                    found[int(folder.name)] = (folder / "cmdline").read_bytes().replace(b"\0", b" ").decode().strip()
                 except (FileNotFoundError, ProcessLookupError):
                     pass
         return found

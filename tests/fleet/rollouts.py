@@ -122,6 +122,5 @@ def recap(printed):
     """{host: {word of the recap: number}}"""
     lines = re.findall(r"^(\S+)\s+: (ok=\d+ .*)$", printed, re.M)
     return {
-        host: {word: int(number) for word, number in (pair.split("=") for pair in text.split())}
-        for host, text in lines
+        host: {word: int(number) for word, number in (pair.split("=") for pair in text.split())} for host, text in lines
     }

@@ -13,9 +13,7 @@ ROOT = Path(__file__).resolve().parents[2]
 def test_a_small_measurement(program, ctl_binary):
     assert Path(ctl_binary).parent == program.binary.parent
     words = ["--homes", "2", "--forks", "2", "--megabytes", "0", "--programs", program.binary.parent]
-    done = subprocess.run(
-        [ROOT / "bench/fleet", *words], capture_output=True, text=True, timeout=1200, check=False
-    )
+    done = subprocess.run([ROOT / "bench/fleet", *words], capture_output=True, text=True, timeout=1200, check=False)
     assert done.returncode == 0, done.stderr
     rows = [line.strip("| \n").split(" | ") for line in done.stdout.splitlines()]
     measured = [row for row in rows if row[0] == "2"]

@@ -68,16 +68,7 @@ def test_the_linter_finds_what_is_put_in(place):
     "tests",
     [
         ["validate-modules", "ansible-doc"],
-        [
-            "import",
-            "compile",
-            "pep8",
-            "yamllint",
-            "shebang",
-            "line-endings",
-            "runtime-metadata",
-            "action-plugin-docs",
-        ],
+        ["import", "compile", "pep8", "yamllint", "shebang", "line-endings", "runtime-metadata", "action-plugin-docs"],
         [
             "empty-init",
             "ignores",
@@ -87,12 +78,7 @@ def test_the_linter_finds_what_is_put_in(place):
             "no-smart-quotes",
             "symlinks",
         ],
-        [
-            "future-import-boilerplate",
-            "metaclass-boilerplate",
-            "no-unicode-literals",
-            "use-argspec-type-path",
-        ],
+        ["future-import-boilerplate", "metaclass-boilerplate", "no-unicode-literals", "use-argspec-type-path"],
         ["pylint"],
     ],
     ids=lambda tests: tests[0],
@@ -128,9 +114,7 @@ def test_the_archive_depends_on_nothing_but_the_tree(scratch):
         source, target = CHECKOUT / name, other / name
         target.parent.mkdir(parents=True, exist_ok=True)
         if source.is_dir():
-            shutil.copytree(
-                source, target, copy_function=shutil.copy, ignore=shutil.ignore_patterns("__pycache__")
-            )
+            shutil.copytree(source, target, copy_function=shutil.copy, ignore=shutil.ignore_patterns("__pycache__"))
         else:
             shutil.copy(source, target)
     (other / "VERSION").write_text(
@@ -141,9 +125,7 @@ def test_the_archive_depends_on_nothing_but_the_tree(scratch):
     assert first.read_bytes() == second.read_bytes()
     with tarfile.open(first) as opened:
         members = opened.getmembers()
-    assert {(one.uid, one.gid, one.uname, one.gname, one.mtime) for one in members} == {
-        (0, 0, "", "", 1773075852)
-    }
+    assert {(one.uid, one.gid, one.uname, one.gname, one.mtime) for one in members} == {(0, 0, "", "", 1773075852)}
     assert {one.mode for one in members} <= {0o644, 0o755}
     names = [one.name for one in members]
     assert names[:2] == ["MANIFEST.json", "FILES.json"] and names[2:] == sorted(names[2:])
@@ -151,9 +133,7 @@ def test_the_archive_depends_on_nothing_but_the_tree(scratch):
 
 
 def test_the_version_is_the_one_of_all_packages():
-    announced = re.search(
-        r"project\(orvpatch VERSION ([\d.]+)", (CHECKOUT / "CMakeLists.txt").read_text()
-    ).group(1)
+    announced = re.search(r"project\(orvpatch VERSION ([\d.]+)", (CHECKOUT / "CMakeLists.txt").read_text()).group(1)
     assert f"\nversion: {announced}\n" in (COLLECTION / "galaxy.yml").read_text()
     assert f"\n## {announced}\n" in (COLLECTION / "CHANGELOG.md").read_text()
     for page in (CHECKOUT / "README.md", COLLECTION / "README.md"):
@@ -182,32 +162,10 @@ def test_the_archive_is_installed_and_documented_offline(place, scratch):
     shutil.rmtree(place)
     made = archive(scratch / "made")
     collections = scratch / "collections"
-    run(
-        place,
-        "ansible-galaxy",
-        "collection",
-        "install",
-        "--offline",
-        made,
-        "-p",
-        collections,
-        cwd=scratch,
-    )
-    run(
-        place,
-        "ansible-galaxy",
-        "collection",
-        "verify",
-        "--offline",
-        "orv.patch",
-        "-p",
-        collections,
-        cwd=scratch,
-    )
+    run(place, "ansible-galaxy", "collection", "install", "--offline", made, "-p", collections, cwd=scratch)
+    run(place, "ansible-galaxy", "collection", "verify", "--offline", "orv.patch", "-p", collections, cwd=scratch)
     for kind, names in DOCUMENTED.items():
-        listed = json.loads(
-            run(place, "ansible-doc", "--json", "-t", kind, "--list", "orv.patch", cwd=scratch)
-        )
+        listed = json.loads(run(place, "ansible-doc", "--json", "-t", kind, "--list", "orv.patch", cwd=scratch))
         assert sorted(listed) == [f"orv.patch.{name}" for name in names]
         for name in names:
             shown = run(place, "ansible-doc", "-t", kind, f"orv.patch.{name}", cwd=scratch)

@@ -55,12 +55,7 @@ def test_home_info_tells_what_there_is(modules, ready, patch_dir):
     assert found["changed"] is False
     assert found["levels"] == {"kum": "06.10.00.00", "kyn": "06.10.00.00"}
     assert found["instances"] == [
-        {
-            "product": "kyn",
-            "name": "north",
-            "pid": home.pid("yn", "north"),
-            "user": found["instances"][0]["user"],
-        }
+        {"product": "kyn", "name": "north", "pid": home.pid("yn", "north"), "user": found["instances"][0]["user"]}
     ]
     assert (found["history"], found["transactions"], found["open_transactions"]) == ([], [], [])
     assert "verification" not in found
@@ -241,11 +236,7 @@ def test_the_last_transaction_is_taken_back_and_no_other(modules, ready, patch_d
     assert modules.run("undone", check=True)["transaction"] == second["transaction"]
     assert home.level("yn") == "06100100"
     found = modules.run("undone")
-    assert (found["changed"], found["verdict"], found["transaction"]) == (
-        True,
-        "undone",
-        second["transaction"],
-    )
+    assert (found["changed"], found["verdict"], found["transaction"]) == (True, "undone", second["transaction"])
     assert (found["levels_before"], found["levels_after"]) == ({"kyn": "06.10.01.00"}, {"kyn": "06.10.00.00"})
     assert home.read("lib/replaced") == b"old\n"
     before = home.tree()
@@ -276,11 +267,7 @@ def test_of_a_patch_on_the_host_only_the_same_contents_are_taken_back(modules, r
     modules.run("applied", patch=path)
     other = scratch / "other"
     other.mkdir()
-    for named in (
-        Patch("um").file("lib/um").write(other),
-        Patch("yn").file("lib/changed").write(other),
-        other,
-    ):
+    for named in (Patch("um").file("lib/um").write(other), Patch("yn").file("lib/changed").write(other), other):
         assert modules.run("undone", patch=named)["verdict"] == "unchanged"
     assert ready.level("yn") == "06100100"
     found = modules.fail("undone", patch=scratch / "none")
@@ -602,9 +589,7 @@ def test_an_undo_behind_a_lost_connection_is_told(modules, ready, patch_dir):
     home.fail("stop", "yn", status=0)  # claims success and stops nothing: the undo waits for the process
     process = modules.start("undone")
     limit = time.monotonic() + 60
-    while not any(
-        json.loads(one.read_bytes())["action"] == "undo" for one in modules.state.glob("*/*/run.json")
-    ):
+    while not any(json.loads(one.read_bytes())["action"] == "undo" for one in modules.state.glob("*/*/run.json")):
         assert time.monotonic() < limit
         time.sleep(0.02)
     os.killpg(process.pid, 9)

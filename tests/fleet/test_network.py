@@ -6,15 +6,12 @@ from network import HOME, PROGRAMS
 
 
 def test_each_host_is_one_of_its_own(network):
-    assert set(network.controller.modules("fleet", "ansible.builtin.ping")) == {
-        host.name for host in network.hosts
-    }
+    assert set(network.controller.modules("fleet", "ansible.builtin.ping")) == {host.name for host in network.hosts}
     assert len({host.known_host().split()[2] for host in network.hosts}) == len(network.hosts) == 8
     for host in network.hosts:
         agents = [command for command in host.processes().values() if command.startswith("tail -f")]
         assert sorted(agents) == sorted(
-            f"tail -f {HOME}/control/processes/{agent}"
-            for agent in ("ox.None", "um.None", "yn.east", "yn.west")
+            f"tail -f {HOME}/control/processes/{agent}" for agent in ("ox.None", "um.None", "yn.east", "yn.west")
         )
         assert host.home.instances() == [("ox", ""), ("um", ""), ("yn", "east"), ("yn", "west")]
         assert host.run("uname", "-n").stdout == f"{host.name}\n"

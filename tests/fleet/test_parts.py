@@ -11,9 +11,7 @@ from modules import COLLECTION
 
 
 @pytest.mark.parametrize(
-    "path",
-    sorted(COLLECTION.glob("plugins/module*/*.py")),
-    ids=lambda path: f"{path.parent.name}/{path.stem}",
+    "path", sorted(COLLECTION.glob("plugins/module*/*.py")), ids=lambda path: f"{path.parent.name}/{path.stem}"
 )
 def test_the_grammar_is_that_of_python_3_6(path):
     ast.parse(path.read_text(encoding="utf-8"), feature_version=(3, 6))
@@ -53,9 +51,7 @@ def test_a_host_that_was_not_asked_is_untouched(part):
 
 
 def test_a_host_that_was_applied_has_levels_times_and_record(part):
-    made = entry_of(
-        part, facts=FACTS, check={"verdict": "checked"}, result=APPLIED, verified=AFTER, batch=BATCH
-    )
+    made = entry_of(part, facts=FACTS, check={"verdict": "checked"}, result=APPLIED, verified=AFTER, batch=BATCH)
     assert (made["verdict"], made["batch"], made["transaction"]) == ("applied", 2, "T1")
     assert (made["levelsBefore"], made["levelsAfter"]) == ({"kyn": "06.10.00.00"}, {"kyn": "06.10.01.00"})
     assert (made["started"], made["ended"]) == (RECORD["started"], RECORD["ended"])
@@ -78,13 +74,7 @@ def test_a_host_that_was_unchanged_has_the_times_of_its_batch(part):
         ({"result": APPLIED, "verified": {"failed": True, "msg": "crashed"}}, "incomplete", "crashed"),
         ({"facts": {"unreachable": True, "msg": "no route"}}, "unreachable", "no route"),
         (
-            {
-                "staged": {
-                    "failed": True,
-                    "msg": "one item",
-                    "results": [{"failed": True, "msg": "no space"}, {}],
-                }
-            },
+            {"staged": {"failed": True, "msg": "one item", "results": [{"failed": True, "msg": "no space"}, {}]}},
             "refused",
             "no space",
         ),
@@ -95,11 +85,7 @@ def test_a_host_that_was_unchanged_has_the_times_of_its_batch(part):
         ({"result": FAILED, "verified": {"unreachable": True, "msg": "cut"}}, "failed", "no space"),
         ({"result": FAILED, "verified": {"failed": True, "msg": "crashed"}}, "failed", "no space"),
         ({"result": FAILED, "verified": {"verdict": "checked"}}, "failed", "no space"),
-        (
-            {"check": {"failed": True, "verdict": "refused", "msg": "in use"}, "result": APPLIED},
-            "applied",
-            "",
-        ),
+        ({"check": {"failed": True, "verdict": "refused", "msg": "in use"}, "result": APPLIED}, "applied", ""),
         (
             {"result": FAILED, "undone": {"failed": True, "verdict": "refused", "msg": "in use"}},
             "incomplete",
@@ -113,11 +99,7 @@ def test_a_host_that_was_unchanged_has_the_times_of_its_batch(part):
         ({"check": {"skipped": True, "verdict": "checked"}}, "untouched", ""),
         ({"result": APPLIED, "undone": {"verdict": "unchanged"}}, "applied", ""),
         ({"result": APPLIED, "undone": {"failed": True, "msg": "no"}}, "incomplete", "not taken back: no"),
-        (
-            {"result": APPLIED, "undone": {"unreachable": True, "msg": "no"}},
-            "unreachable",
-            "not taken back: no",
-        ),
+        ({"result": APPLIED, "undone": {"unreachable": True, "msg": "no"}}, "unreachable", "not taken back: no"),
     ],
 )
 def test_the_last_task_that_decides_is_told(part, registered, verdict, reason):
@@ -204,15 +186,10 @@ def source(part, patch_dir):
 
 def test_a_directory_goes_whole(source, patch_dir):
     made = source()
-    assert [one["name"] for one in made["files"]] == sorted(
-        [NAME, "readme.txt", "SHA256SUMS", "SHA256SUMS.asc"]
-    )
+    assert [one["name"] for one in made["files"]] == sorted([NAME, "readme.txt", "SHA256SUMS", "SHA256SUMS.asc"])
     assert (made["patches"], made["is_directory"]) == ([NAME], True)
     assert made["digests"][NAME] == hashlib.sha256(b"archive").hexdigest()
-    assert (
-        next(one["sha1"] for one in made["files"] if one["name"] == NAME)
-        == hashlib.sha1(b"archive").hexdigest()
-    )
+    assert next(one["sha1"] for one in made["files"] if one["name"] == NAME) == hashlib.sha1(b"archive").hexdigest()
     again = source()["id"]
     (patch_dir / "readme.txt").write_text("Fix pack 3\n")
     assert made["id"] == again != source()["id"]
@@ -235,13 +212,7 @@ def test_a_file_that_is_not_the_listed_one_does_not_go(source, patch_dir):
 def test_what_is_a_patch_is_told_by_the_name(part):
     is_patch = part("lookup.source").is_patch
     assert is_patch(NAME) and is_patch(f"{NAME}.sha256")
-    for name in (
-        "readme.txt",
-        "SHA256SUMS",
-        "how_to_install_it.txt",
-        "kyn_lpp266_vemx_fp0002.tar",
-        f"old_{NAME}",
-    ):
+    for name in ("readme.txt", "SHA256SUMS", "how_to_install_it.txt", "kyn_lpp266_vemx_fp0002.tar", f"old_{NAME}"):
         assert not is_patch(name)
 
 

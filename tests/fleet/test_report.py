@@ -169,9 +169,7 @@ def test_the_page_asks_for_nothing(shows, browser):
     assert browser.run("[...document.links].every(a => a.getAttribute('href').startsWith('#'))")
     assert browser.run("[...document.links].every(a => document.querySelector(a.getAttribute('href')))")
     assert (
-        browser.run(
-            "(ids => ids.length - new Set(ids).size)([...document.querySelectorAll('[id]')].map(e => e.id))"
-        )
+        browser.run("(ids => ids.length - new Set(ids).size)([...document.querySelectorAll('[id]')].map(e => e.id))")
         == 0
     )
 
@@ -179,9 +177,7 @@ def test_the_page_asks_for_nothing(shows, browser):
 def test_the_failed_ones_come_first_with_reason_and_record(shows, browser):
     shows(a_stopped_rollout())
     assert browser.texts("h1") == ["stopped"]
-    assert (
-        browser.texts("header p")[1] == "8 homes on 8 hosts: 1 failed, 1 unreachable, 4 untouched, 2 applied"
-    )
+    assert browser.texts("header p")[1] == "8 homes on 8 hosts: 1 failed, 1 unreachable, 4 untouched, 2 applied"
     assert browser.texts("h2") == [
         "2 homes to look at",
         "Homes by verdict",
@@ -269,9 +265,7 @@ def test_paper_is_white_even_where_the_screen_is_dark(shows, browser):
 
 def test_what_is_too_long_is_cut_and_says_so(shows, browser):
     output = "".join(f"line {number}\n" for number in range(20000))
-    whole = record(
-        installer={"status": 1, "stdout": output, "stderr": ""}, messages=[f"m{n}" for n in range(300)]
-    )
+    whole = record(installer={"status": 1, "stdout": output, "stderr": ""}, messages=[f"m{n}" for n in range(300)])
     shows(document(*(entry(f"host{number:03}", "failed", record=whole) for number in range(150))))
     assert len(browser.texts("article")) == 100
     assert len(browser.texts("ul.tiles li")) == len(browser.texts("table.homes tbody tr")) == 150
@@ -295,16 +289,7 @@ MADE_UP = [7, "text", ["list"], {"a": {"b": []}}, [None], True]
 @pytest.mark.parametrize("value", MADE_UP, ids=repr)
 def test_what_a_host_makes_up_spoils_no_report(value):
     """A host sends what it likes: the others of the fleet are told all the same."""
-    fields = [
-        "components",
-        "levelsBefore",
-        "levelsAfter",
-        "transaction",
-        "record",
-        "reason",
-        "started",
-        "batch",
-    ]
+    fields = ["components", "levelsBefore", "levelsAfter", "transaction", "record", "reason", "started", "batch"]
     broken = [{**entry(name, "failed"), name: value} for name in fields]
     broken += [entry(f"r-{name}", "failed", record=record(**{name: value})) for name in record()]
     broken += [entry("component", components=[{"code": value, "level": value}])]
@@ -360,9 +345,7 @@ def test_a_rollout_that_was_taken_back_is_no_good_end(shows, browser, found, ver
     assert json.loads(as_json(content))["rollout"] is True
     shows(content)
     assert browser.texts("h1") == [verdict]
-    assert browser.run("document.querySelector('header').className") == (
-        "good" if verdict == "unchanged" else "bad"
-    )
+    assert browser.run("document.querySelector('header').className") == ("good" if verdict == "unchanged" else "bad")
 
 
 def test_an_undo_that_finds_some_homes_without_the_patches_is_a_good_end(shows, browser):
@@ -449,9 +432,7 @@ def test_no_cell_of_the_table_is_a_formula_or_breaks_a_line():
         f"'{text}" if text[0] in "=+-@" else shown(text) for text in texts
     )
     assert len(as_csv(content).split("\r\n")) == len(texts) + 2
-    assert not [
-        line for line in lines for cell in line.values() if cell.startswith(("=", "+", "-", "@", "\t"))
-    ]
+    assert not [line for line in lines for cell in line.values() if cell.startswith(("=", "+", "-", "@", "\t"))]
 
 
 # --- the module ------------------------------------------------------------------------------------------------

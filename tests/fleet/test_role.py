@@ -32,9 +32,7 @@ def play(controller, home, patch_dir, ctl_binary):
         "fixpack_source": str(patch_dir),
         "fixpack_orvpatchctl": str(ctl_binary),
     }
-    (
-        controller.folder / "plays"
-    ).mkdir()  # not where the engine is started: it searches beside a playbook, too
+    (controller.folder / "plays").mkdir()  # not where the engine is started: it searches beside a playbook, too
     (controller.folder / "plays/play.yml").write_text(PLAY)
 
     def run(*words, playbook="plays/play.yml", **other):
@@ -73,9 +71,7 @@ def test_the_role_fails_where_the_home_differs_in_the_end(play, home, patch_dir)
     assert "incomplete: lib/new" in printed
 
 
-def test_a_patch_that_its_checksums_do_not_list_so_does_not_leave_the_controller(
-    play, home, patch_dir, controller
-):
+def test_a_patch_that_its_checksums_do_not_list_so_does_not_leave_the_controller(play, home, patch_dir, controller):
     (patch_dir / "SHA256SUMS").write_text(f"{'0' * 64}  {Patch('yn').filename}\n")
     status, printed, changed = play()
     assert (status, changed) == (2, 0)
@@ -138,9 +134,7 @@ def sign(scratch, patch_dir):
 
     def gpg(*words):
         command = ["gpg", "--batch", "-q", *words]
-        return subprocess.run(
-            command, env=environment, cwd=patch_dir, check=True, stdout=subprocess.PIPE
-        ).stdout
+        return subprocess.run(command, env=environment, cwd=patch_dir, check=True, stdout=subprocess.PIPE).stdout
 
     def make():
         (patch_dir / "SHA256SUMS.asc").unlink(missing_ok=True)

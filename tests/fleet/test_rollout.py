@@ -85,22 +85,17 @@ def test_a_host_that_fails_in_the_middle_stops_the_rollout(fleet):
     assert (first["host"], first["batch"], first["record"]["installer"]["status"]) == ("host4", 3, 23)
     assert "10_convert.sh" in first["reason"]
     after = fleet.listings()
-    assert {host: after[host] for host in ("host7", "host8")} == {
-        host: before[host] for host in ("host7", "host8")
-    }
+    assert {host: after[host] for host in ("host7", "host8")} == {host: before[host] for host in ("host7", "host8")}
     assert fleet.attempts() == {**numbered(ALL, ["PASS"]), **numbered([7, 8], []), "host4": ["FAIL"]}
-    taken = fleet.controller.playbook(
-        "undo", "--limit", "host4", variables=fleet.variables(fixpack_report="")
-    )
+    taken = fleet.controller.playbook("undo", "--limit", "host4", variables=fleet.variables(fixpack_report=""))
     assert recap(taken)["host4"]["failed"] == 0
     assert fleet.listings()["host4"] == before["host4"]
     assert fleet.hosts[3].home.instances() == AGENTS
     fleet.hosts[3].home.remove("control/broken")
     report = fleet.play("rollout")
-    assert report["verdicts"] == {
-        **numbered(ALL, "applied"),
-        **numbered([1, 2, 3, 5, 6], "unchanged"),
-    }, report["reasons"]
+    assert report["verdicts"] == {**numbered(ALL, "applied"), **numbered([1, 2, 3, 5, 6], "unchanged")}, report[
+        "reasons"
+    ]
     assert fleet.levels() == numbered(ALL, AFTER)
 
 
@@ -203,16 +198,12 @@ def test_two_controllers_at_once_patch_each_home_once(fleet):
     hold(host)
     first = fleet.start("rollout", fixpack_report_name="first")
     fleet.await_held(host)  # the first has the canary at work when the second begins
-    second = fleet.start(
-        "rollout", controller=Controller.of(fleet.network, "d"), fixpack_report_name="second"
-    )
+    second = fleet.start("rollout", controller=Controller.of(fleet.network, "d"), fixpack_report_name="second")
     fleet.await_that(lambda: len(host.sessions()) > 1, "the second controller does not come")
     release(host)
     printed = [one.communicate(timeout=900)[0] for one in (first, second)]
     reports = [fleet.report(fixpack_report_name=name) for name in ("first", "second")]
-    assert (first.returncode, second.returncode) == (0, 0), [
-        report["reasons"] for report in reports
-    ] + printed
+    assert (first.returncode, second.returncode) == (0, 0), [report["reasons"] for report in reports] + printed
     for name in numbered(ALL, ""):
         assert {report["verdicts"][name] for report in reports} <= {"applied", "unchanged"}
     assert fleet.attempts() == numbered(ALL, ["PASS"])

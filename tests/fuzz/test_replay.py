@@ -20,8 +20,6 @@ def test_all_rules_hold(program, name):
     if name in OF_ORVPATCHCTL and not (program.binary.parent / "orvpatchctl").exists():
         pytest.skip("built without orvpatchctl")
     replay = program.binary.parent / f"tests/fuzz/replay_{name}"
-    done = subprocess.run(
-        [*program.runner, replay, CORPUS / name], timeout=300, capture_output=True, check=False
-    )
+    done = subprocess.run([*program.runner, replay, CORPUS / name], timeout=300, capture_output=True, check=False)
     inputs = sum(path.stat().st_size + 1 for path in (CORPUS / name).iterdir())
     assert (done.returncode, done.stderr.decode(errors="replace")) == (0, f"{inputs} inputs\n")

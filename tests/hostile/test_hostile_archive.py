@@ -16,16 +16,27 @@ TAR_FAILED = "Bad return code from tar -xf: 2"
 
 
 def sample_archive():
-    return (RawArchive(PATCH).file("updated_files/bin/first", b"1" * 700).file("updated_files/bin/second", b"2" * 600)
-            .directory("updated_files/lib").file("updated_files/lib/third", b"3" * BLOCK))
+    return (
+        RawArchive(PATCH)
+        .file("updated_files/bin/first", b"1" * 700)
+        .file("updated_files/bin/second", b"2" * 600)
+        .directory("updated_files/lib")
+        .file("updated_files/lib/third", b"3" * BLOCK)
+    )
 
 
 def cuts():
     """Every boundary between two members, and places within each: in its header, in its data, in a block."""
     archive = sample_archive()
     edges = [*archive.boundaries, archive.boundaries[-1] + BLOCK, len(archive.content)]
-    return sorted({at + offset for at in edges for offset in (0, 1, 256, BLOCK, BLOCK + 100)
-                   if at + offset <= len(archive.content)})
+    return sorted(
+        {
+            at + offset
+            for at in edges
+            for offset in (0, 1, 256, BLOCK, BLOCK + 100)
+            if at + offset <= len(archive.content)
+        }
+    )
 
 
 def unpacked_by_tar(archive, folder):
@@ -37,8 +48,7 @@ def unpacked_by_tar(archive, folder):
 
 
 @pytest.mark.parametrize("length", cuts())
-def test_a_truncated_archive_is_applied_only_as_far_as_tar_finds_no_fault(
-        program, product, patch_dir, scratch, length):
+def test_a_truncated_archive_is_applied_only_as_far_as_tar_finds_no_fault(program, product, patch_dir, scratch, length):
     archive = sample_archive().write(patch_dir, upto=length)
     status, files = unpacked_by_tar(archive, scratch / "unpacked")
     new = {path.removeprefix("updated_files/"): content for path, content in files.items() if path != "patch.ini"}
@@ -58,13 +68,17 @@ def test_a_truncated_archive_is_applied_only_as_far_as_tar_finds_no_fault(
 
 
 def test_the_cuts_meet_both_kinds_of_archive(scratch):
-    statuses = {unpacked_by_tar(sample_archive().write(scratch, upto=length), scratch / str(length))[0]
-                for length in cuts()}
+    statuses = {
+        unpacked_by_tar(sample_archive().write(scratch, upto=length), scratch / str(length))[0] for length in cuts()
+    }
     assert statuses == {0, 2}
 
 
-@pytest.mark.parametrize("content", [b"", b"\0", b"no archive\n", bytes(range(256)) * 8, b"\xff" * 4096],
-                         ids=["empty", "one NUL", "text", "all bytes", "all ones"])
+@pytest.mark.parametrize(
+    "content",
+    [b"", b"\0", b"no archive\n", bytes(range(256)) * 8, b"\xff" * 4096],
+    ids=["empty", "one NUL", "text", "all bytes", "all ones"],
+)
 @pytest.mark.parametrize("action", ["-i", "-t"])
 def test_what_is_no_archive_is_refused(program, product, patch_dir, action, content):
     archive = patch_dir / PATCH.filename
@@ -86,9 +100,11 @@ def test_a_compressed_archive_is_whatever_tar_makes_of_it(program, product, patc
 
 
 @pytest.mark.parametrize("action", ["-i", "-t"])
-@pytest.mark.parametrize("patch, dotted", [(Patch("ox").file("bin/tool"), True),
-                                           (Patch("ox", descriptor=False).file("bin/tool"), False)],
-                         ids=["./patch.ini", "none"])
+@pytest.mark.parametrize(
+    "patch, dotted",
+    [(Patch("ox").file("bin/tool"), True), (Patch("ox", descriptor=False).file("bin/tool"), False)],
+    ids=["./patch.ini", "none"],
+)
 def test_without_a_member_patch_ini_there_is_no_patch(program, product, patch_dir, action, patch, dotted):
     archive = patch.write(patch_dir, dotted=dotted)
     before = product_tree(product)
@@ -104,8 +120,9 @@ UNREADABLE = {
 }
 
 
-@pytest.mark.parametrize("kind", [
-    "directory", "full directory", "fifo", pytest.param("device", marks=pytest.mark.needs_root)])
+@pytest.mark.parametrize(
+    "kind", ["directory", "full directory", "fifo", pytest.param("device", marks=pytest.mark.needs_root)]
+)
 @pytest.mark.parametrize("action", ["-i", "-t"])
 def test_a_descriptor_that_is_no_file_cannot_be_read(program, product, patch_dir, action, kind):
     archive = UNREADABLE[kind](RawArchive()).file("updated_files/bin/tool").write(patch_dir)
@@ -125,9 +142,25 @@ def test_a_descriptor_of_many_gigabytes_is_not_read(program, product, patch_dir,
     assert program.install(product, archive) == refused(product, 5, text)
 
 
-@pytest.mark.parametrize("name", [
-    b"n" * 255, b"-rf", b"--help", b" ", b"a\nb", b"\tx\t", b"%n%s%x", b"'\"`$(touch x)`;&|", b"\xff\xfe\x01\x7f",
-    b"...", b"a\\b", b"*", "\N{SNOWMAN}".encode()], ids=repr)
+@pytest.mark.parametrize(
+    "name",
+    [
+        b"n" * 255,
+        b"-rf",
+        b"--help",
+        b" ",
+        b"a\nb",
+        b"\tx\t",
+        b"%n%s%x",
+        b"'\"`$(touch x)`;&|",
+        b"\xff\xfe\x01\x7f",
+        b"...",
+        b"a\\b",
+        b"*",
+        "\N{SNOWMAN}".encode(),
+    ],
+    ids=repr,
+)
 def test_a_name_is_installed_as_it_stands(program, product, patch_dir, name):
     archive = RawArchive(PATCH).file("updated_files/bin/" + os.fsdecode(name)).write(patch_dir)
     before = product.tree("bin")
@@ -183,11 +216,11 @@ def test_a_path_that_fits_the_home_but_not_the_temporary_directory(program, deep
 def test_a_path_that_fits_nowhere_ends_the_patch(program, deep_product, patch_dir):
     product = deep_product
     folder, archive = deep_archive(4078)  # tar itself still reaches it from tmp/kox
-    made = product.prefix + "./" + folder[:200 * 20] + "/"
+    made = product.prefix + "./" + folder[: 200 * 20] + "/"
     text = f"Unable to create directory: {made}"[:1023]  # what the catalogue's buffer holds
     assert program.install(product, archive.write(patch_dir)) == refused(product, 26, text)
     assert [line.result for line in product.history()] == ["FAIL"]
-    assert os.listdir(product.path / folder[:199 * 2 + 1]) == ["f" * 199]  # nothing is taken back
+    assert os.listdir(product.path / folder[: 199 * 2 + 1]) == ["f" * 199]  # nothing is taken back
 
 
 def test_a_directory_of_patches_stops_at_the_first_archive_that_is_none(program, product, patch_dir):
@@ -196,9 +229,15 @@ def test_a_directory_of_patches_stops_at_the_first_archive_that_is_none(program,
     (patch_dir / PATCH.filename).write_bytes(b"no archive\n")
     result = program.install(product, patch_dir)
     accepted = os.listdir(patch_dir)[0] == Patch("yn").filename
-    code, text = (3, TAR_FAILED) if accepted else (
-        32, f"Unable to locate or install patch files which are applicable to this\nsystem in the directory "
-            f"specified: {patch_dir}.")
+    code, text = (
+        (3, TAR_FAILED)
+        if accepted
+        else (
+            32,
+            f"Unable to locate or install patch files which are applicable to this\nsystem in the directory "
+            f"specified: {patch_dir}.",
+        )
+    )
     assert result == refused(product, code, text)
     assert not product.exists("bin/tool")
     assert SUCCESS not in result.out

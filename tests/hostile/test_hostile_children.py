@@ -18,16 +18,21 @@ PRINT = "head -c {size} /dev/zero | tr '\\0' x"
 
 
 def messages(product, prefix, component="patchprocessor"):
-    return [message.removeprefix(prefix) for message in product.log().messages(component=component)
-            if message.startswith(prefix)]
+    return [
+        message.removeprefix(prefix)
+        for message in product.log().messages(component=component)
+        if message.startswith(prefix)
+    ]
 
 
 @pytest.fixture
 def run_script(program, product, patch_dir):
     """Installs a patch with one post command of this body."""
+
     def run(body, status=0, **options):
         archive = Patch("ox").file("bin/tool").script("work.sh", "post", body=body, status=status).write(patch_dir)
         return program.install(product, archive, **options)
+
     return run
 
 
@@ -40,9 +45,17 @@ def test_the_first_4096_bytes_of_each_stream_are_kept(run_script, product, size,
     assert messages(product, "stdErr: ") == ["y" * min(size, KEPT)]
 
 
-@pytest.mark.parametrize("text, kept", [
-    (r"abc\0def", "abc"), (r"\0abc", ""), (r"\0\0\0", ""), (r"%%n%%s\0", "%n%s"), (r"\377\376\001", "\udcff\udcfe\x01"),
-    (r"line\nline\n\n", "line\nline\n\n")])
+@pytest.mark.parametrize(
+    "text, kept",
+    [
+        (r"abc\0def", "abc"),
+        (r"\0abc", ""),
+        (r"\0\0\0", ""),
+        (r"%%n%%s\0", "%n%s"),
+        (r"\377\376\001", "\udcff\udcfe\x01"),
+        (r"line\nline\n\n", "line\nline\n\n"),
+    ],
+)
 def test_of_a_childs_output_nothing_behind_a_nul_counts(run_script, product, text, kept):
     assert run_script(f"printf '{text}'; printf '{text}' >&2") == INSTALLED
     assert messages(product, "stdOut: ") == messages(product, "stdErr: ") == [kept]
@@ -60,12 +73,16 @@ def test_a_command_that_a_signal_ends_counts_as_good(run_script, product, sign):
     assert product.log().messages("INFO").count("Successfully executed: work.sh") == 1
 
 
-@pytest.mark.parametrize("stub, status, text", [
-    ("kill -9 $$", 5, "Unable to read file [{home}tmp/kox/patch.ini]: No such file or directory"),
-    ("exit 255", 3, "Bad return code from tar -xf: 255"),
-    ("head -c 60000 /dev/zero; head -c 60000 /dev/zero >&2; exit 1", 3, "Bad return code from tar -xf: 1"),
-    ("sleep 300 & exit 4", 3, "Bad return code from tar -xf: 4"),
-], ids=["killed", "255", "60,000 bytes", "background"])
+@pytest.mark.parametrize(
+    "stub, status, text",
+    [
+        ("kill -9 $$", 5, "Unable to read file [{home}tmp/kox/patch.ini]: No such file or directory"),
+        ("exit 255", 3, "Bad return code from tar -xf: 255"),
+        ("head -c 60000 /dev/zero; head -c 60000 /dev/zero >&2; exit 1", 3, "Bad return code from tar -xf: 1"),
+        ("sleep 300 & exit 4", 3, "Bad return code from tar -xf: 4"),
+    ],
+    ids=["killed", "255", "60,000 bytes", "background"],
+)
 def test_a_tar_that_misbehaves(program, product, patch_dir, scratch, stub, status, text):
     path = stubs(scratch / "bin", tar=stub)
     result = program.install(product, Patch("ox").file("bin/tool").write(patch_dir), env={"PATH": path})
@@ -80,12 +97,20 @@ def test_a_tar_that_cannot_be_found(program, product, patch_dir, scratch):
     assert product.log().messages("ERROR", "process.cpp") == ["error calling execvp = 2: No such file or directory"]
 
 
-@pytest.mark.parametrize("stub", [
-    "kill -9 $$", "exit 0", "exec >&-", PRINT.format(size=60000), "head -c 5000 /dev/zero; echo {pid}",
-    PRINT.format(size=4096) + "; echo {pid}", "echo {pid} >&2"],
-    ids=["killed", "silent", "closed", "60,000 bytes", "NULs", "too late", "on standard error"])
-def test_a_process_that_ps_does_not_show_within_4096_bytes_does_not_run(
-        program, product, patch_dir, scratch, stub):
+@pytest.mark.parametrize(
+    "stub",
+    [
+        "kill -9 $$",
+        "exit 0",
+        "exec >&-",
+        PRINT.format(size=60000),
+        "head -c 5000 /dev/zero; echo {pid}",
+        PRINT.format(size=4096) + "; echo {pid}",
+        "echo {pid} >&2",
+    ],
+    ids=["killed", "silent", "closed", "60,000 bytes", "NULs", "too late", "on standard error"],
+)
+def test_a_process_that_ps_does_not_show_within_4096_bytes_does_not_run(program, product, patch_dir, scratch, stub):
     product.start("ox")
     path = stubs(scratch / "bin", ps=stub.format(pid=product.pid("ox")))
     assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir), env={"PATH": path}) == INSTALLED
@@ -98,9 +123,11 @@ def test_the_output_of_the_control_script_is_kept_like_any_other(program, produc
     product.component("yn", desc="D")
     product.start("yn")
     product.fail(verb, "yn", status=9, out="x" * size, err="y" * size)
-    text = {"stop": "Unable to stop agent for product D.  The agent for product D may be running under a different userid "
-                    "and must be manually stopped before applying the patch.",
-            "start": "Unable to start agent for product D."}
+    text = {
+        "stop": "Unable to stop agent for product D.  The agent for product D may be running under a different userid "
+        "and must be manually stopped before applying the patch.",
+        "start": "Unable to start agent for product D.",
+    }
     result = program.install(product, Patch("yn").file("bin/tool").write(patch_dir))
     assert result == refused(product, code, text[verb])
     assert messages(product, "stdout: ", "orvcomponent")[-1] == "x" * min(size, KEPT)
@@ -132,15 +159,17 @@ def test_a_program_left_behind_with_the_pipes_is_not_waited_for(run_script, prod
     assert run_script(f'{output}\nsleep 300 & echo $! >"$QUILLHOME/left"') == INSTALLED
     assert time.monotonic() - start < 30
     assert messages(product, "stdOut: ") == messages(product, "stdErr: ") == [kept]
-    pid, = left_behind()
+    (pid,) = left_behind()
     assert os.path.isdir(f"/proc/{pid}")
 
 
 def test_a_program_left_behind_that_goes_on_printing_is_not_waited_for(run_script, product, left_behind):
-    body = ('while :; do printf more; : >"$QUILLHOME/printed"; sleep 0.01; done & echo $! >"$QUILLHOME/left"\n'
-            'while [ ! -e "$QUILLHOME/printed" ]; do sleep 0.01; done')
+    body = (
+        'while :; do printf more; : >"$QUILLHOME/printed"; sleep 0.01; done & echo $! >"$QUILLHOME/left"\n'
+        'while [ ! -e "$QUILLHOME/printed" ]; do sleep 0.01; done'
+    )
     assert run_script(body) == INSTALLED
-    kept, = messages(product, "stdOut: ")
+    (kept,) = messages(product, "stdOut: ")
     assert kept == "more" * (len(kept) // 4) and kept
 
 
@@ -149,11 +178,19 @@ def test_a_script_without_output_or_input(run_script, product):
     assert run_script("read line; echo got=$line", stdin=None) == INSTALLED
 
 
-@pytest.mark.parametrize("content, mode, status", [
-    # What the system cannot execute is handed to the shell, by the rule of execvp.
-    ("echo plain", 0o755, 0), ("", 0o755, 0), ("#!" + "/" * 5000, 0o755, 0), ("\x7fELF\n", 0o755, 127),
-    ("#!/nonexistent\n", 0o755, 2), ("#!/bin/sh\n", 0o644, 13)],
-    ids=["no shebang", "empty", "long interpreter", "broken binary", "no interpreter", "not executable"])
+@pytest.mark.parametrize(
+    "content, mode, status",
+    [
+        # What the system cannot execute is handed to the shell, by the rule of execvp.
+        ("echo plain", 0o755, 0),
+        ("", 0o755, 0),
+        ("#!" + "/" * 5000, 0o755, 0),
+        ("\x7fELF\n", 0o755, 127),
+        ("#!/nonexistent\n", 0o755, 2),
+        ("#!/bin/sh\n", 0o644, 13),
+    ],
+    ids=["no shebang", "empty", "long interpreter", "broken binary", "no interpreter", "not executable"],
+)
 def test_a_file_that_can_hardly_be_executed(program, product, patch_dir, content, mode, status):
     archive = Patch("ox").member("work", content, mode).command("pre", "work").file("bin/tool").write(patch_dir)
     result = program.install(product, archive)
@@ -233,8 +270,12 @@ def left_by_the_caller(line):
 
 @pytest.mark.parametrize("status", [0, 1])
 def test_a_child_of_the_caller_is_not_taken_for_a_command(program, product, patch_dir, status):
-    archive = Patch("ox").file("bin/tool").script(
-        "work.sh", "pre", body='>"$QUILLHOME/tmp/go"; sleep 1', status=7).write(patch_dir)
+    archive = (
+        Patch("ox")
+        .file("bin/tool")
+        .script("work.sh", "pre", body='>"$QUILLHOME/tmp/go"; sleep 1', status=7)
+        .write(patch_dir)
+    )
     other = f"until [ -e '{product.path}/tmp/go' ]; do sleep 0.05; done; exit {status}"
     result = program.install(product, archive, wrapper=left_by_the_caller(other))
     assert result == refused(product, 21, "Bad return code from work.sh: 7")
@@ -256,8 +297,13 @@ def test_what_is_left_to_the_first_process_of_a_container_is_not_taken_for_a_com
     container = ["unshare", "--pid", "--fork", "--kill-child"]
     if subprocess.run([*container, "true"], capture_output=True, check=False).returncode != 0:
         pytest.skip("needs a system that lets root make process namespaces")
-    archive = Patch("ox").file("bin/tool").script("1.sh", "pre", body="(sleep 0.5) >/dev/null 2>&1 &").script(
-        "2.sh", "pre", body="sleep 1.5", status=7).write(patch_dir)
+    archive = (
+        Patch("ox")
+        .file("bin/tool")
+        .script("1.sh", "pre", body="(sleep 0.5) >/dev/null 2>&1 &")
+        .script("2.sh", "pre", body="sleep 1.5", status=7)
+        .write(patch_dir)
+    )
     result = program.install(product, archive, wrapper=container)
     assert result == refused(product, 21, "Bad return code from 2.sh: 7")
     assert not product.exists("bin/tool")

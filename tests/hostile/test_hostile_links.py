@@ -69,7 +69,7 @@ def test_a_report_lists_the_files_behind_a_link_and_leaves_them(program, product
     before = product_tree(product)
     report = program.report(product, archive)
     assert report == Result(0, report.out, b"")
-    listed = (f"\nThe following files will be installed or replaced with new files:\n    {product.prefix}lib/secret\n\n")
+    listed = f"\nThe following files will be installed or replaced with new files:\n    {product.prefix}lib/secret\n\n"
     assert listed.encode() in report.out
     assert (foreign / "secret").stat().st_mode & 0o7777 == 0o600
     assert product_tree(product) == before
@@ -92,8 +92,12 @@ def test_the_tree_of_files_itself_may_be_a_link(program, product, patch_dir, for
 
 def test_a_dangling_link_counts_as_moved(program, product, patch_dir):
     # KEEP(move-missing-source), KEEP(cleanup-unchecked)
-    archive = (RawArchive(PATCH).link("updated_files/bin/gone", "/nonexistent/file")
-               .file("updated_files/bin/tool").write(patch_dir))
+    archive = (
+        RawArchive(PATCH)
+        .link("updated_files/bin/gone", "/nonexistent/file")
+        .file("updated_files/bin/tool")
+        .write(patch_dir)
+    )
     assert program.install(product, archive) == INSTALLED
     assert product.exists("bin/tool") and not product.exists("bin/gone")
     assert errors(product) == not_removed(product)
@@ -124,9 +128,12 @@ def test_a_link_of_one_patch_takes_no_part_in_the_next(program, product, patch_d
 NESTS = {
     "beside one another": ({"updated_files/l1": None, "l2": None}, ["l1/job", "updated_files/l1/job", "l2/job"]),
     "below a dangling one": ({"gone": "/nonexistent", "a/b/c/l": None}, ["a/b/c/l/job"]),
-    "below two dangling ones": ({"gone": "/nonexistent", "a/gone": "/nonexistent", "a/b/l": None, "a/l": None},
-                                ["a/b/l/job", "a/l/job"]),
-    "relative": ({"a/l": "../../../../foreign", "loop": "loop"}, ["a/l/job"])}
+    "below two dangling ones": (
+        {"gone": "/nonexistent", "a/gone": "/nonexistent", "a/b/l": None, "a/l": None},
+        ["a/b/l/job", "a/l/job"],
+    ),
+    "relative": ({"a/l": "../../../../foreign", "loop": "loop"}, ["a/l/job"]),
+}
 
 
 @pytest.mark.parametrize("nest", NESTS)
@@ -137,8 +144,12 @@ def test_reports_write_nothing_through_a_link_of_another_archive(program, produc
     links, members = NESTS[nest]
     archives = [RawArchive(PATCH), RawArchive(Patch("ox", fixpack="fp0002"))]
     for link, destination in links.items():
-        archives[0].link(link, os.path.relpath(folder, (product.path / "tmp/kox" / link).parent)
-                         if destination and destination.startswith("..") else destination or str(folder))
+        archives[0].link(
+            link,
+            os.path.relpath(folder, (product.path / "tmp/kox" / link).parent)
+            if destination and destination.startswith("..")
+            else destination or str(folder),
+        )
     for member in members:
         archives[1].file(member)
     for archive in archives:
@@ -155,10 +166,12 @@ def test_a_target_that_is_a_dangling_link_is_not_written_through(program, produc
     # Its name is taken, so the new file cannot be linked to it; nothing comes to where it leads.
     os.symlink(scratch / "outside", product.path / "bin/tool")
     archive = Patch("ox").file("bin/tool").write(patch_dir)
-    text = (f"Could not move file {product.prefix}tmp/kox/updated_files/./bin/tool to {product.prefix}./bin/tool. "
-            "Either the product being updated is still running or the file permissions are restricting access to "
-            "the file. Verify the product has been stopped and the file permissions are not restricting access and "
-            "then re-apply the patch.")
+    text = (
+        f"Could not move file {product.prefix}tmp/kox/updated_files/./bin/tool to {product.prefix}./bin/tool. "
+        "Either the product being updated is still running or the file permissions are restricting access to "
+        "the file. Verify the product has been stopped and the file permissions are not restricting access and "
+        "then re-apply the patch."
+    )
     assert program.install(product, archive) == refused(product, 25, text)
     assert not (scratch / "outside").exists()
 
@@ -179,11 +192,15 @@ def test_a_target_directory_that_is_a_link_is_followed(program, product, patch_d
     assert (foreign / "tool").read_bytes() == b"new\n"
 
 
-@pytest.mark.parametrize("folders, links", [
-    ([], {"a": ".", "b": "."}),
-    (["a"], {"a/b": "..", "a/c": ".."}),
-    (["a", "a/b"], {"a/b/c": "../..", "d": "a"}),
-    (["a", "b"], {"a/x": "../b", "b/x": "../a", "b/y": "../a"})])
+@pytest.mark.parametrize(
+    "folders, links",
+    [
+        ([], {"a": ".", "b": "."}),
+        (["a"], {"a/b": "..", "a/c": ".."}),
+        (["a", "a/b"], {"a/b/c": "../..", "d": "a"}),
+        (["a", "b"], {"a/x": "../b", "b/x": "../a", "b/y": "../a"}),
+    ],
+)
 def test_links_that_lead_back_up_are_not_entered(program, product, patch_dir, folders, links):
     # Followed as far as the system follows links, forty deep, two of them make 2 to the power of 40 paths.
     archive = RawArchive(PATCH).file("updated_files/tool")
@@ -201,11 +218,15 @@ def test_links_that_lead_back_up_are_not_entered(program, product, patch_dir, fo
         assert product.tree()[name].kind == "directory"
 
 
-@pytest.mark.parametrize("destination, text", [
-    ("/nonexistent", "Unable to read file [{ini}]: No such file or directory"),
-    (".", "Unable to read file [{ini}]: Invalid argument"),
-    ("patch.ini", "Unable to read file [{ini}]: Too many levels of symbolic links"),
-    ("/etc/passwd", "Missing required section: ProductInfo")])
+@pytest.mark.parametrize(
+    "destination, text",
+    [
+        ("/nonexistent", "Unable to read file [{ini}]: No such file or directory"),
+        (".", "Unable to read file [{ini}]: Invalid argument"),
+        ("patch.ini", "Unable to read file [{ini}]: Too many levels of symbolic links"),
+        ("/etc/passwd", "Missing required section: ProductInfo"),
+    ],
+)
 def test_a_descriptor_that_is_a_link_is_read_through_it(program, product, patch_dir, destination, text):
     archive = RawArchive().link("patch.ini", destination).file("updated_files/tool").write(patch_dir)
     before = product_tree(product)

@@ -89,8 +89,12 @@ def test_a_replaced_file_keeps_its_owner_and_its_set_id_bits(program, product, p
 
 @pytest.mark.needs_root
 def test_a_new_directory_is_the_tools_own_and_open_to_all(program, product, patch_dir):
-    archive = (RawArchive(PATCH).directory("updated_files/bin/sub", 0o2700, uid=12345, gid=54321)
-               .file("updated_files/bin/sub/tool").write(patch_dir))
+    archive = (
+        RawArchive(PATCH)
+        .directory("updated_files/bin/sub", 0o2700, uid=12345, gid=54321)
+        .file("updated_files/bin/sub/tool")
+        .write(patch_dir)
+    )
     assert program.install(product, archive) == INSTALLED
     entry = product.tree("bin")["bin/sub"]
     assert (entry.kind, entry.mode, entry.uid, entry.gid) == ("directory", 0o777, 0, 0)
@@ -102,14 +106,19 @@ def test_a_closed_tree_of_files_stops_an_ordinary_user(program, product, scratch
     archive = (RawArchive(PATCH).file("updated_files/bin/tool").directory("updated_files", 0)).write(scratch)
     before = product.tree("bin")
     refusal = refused(
-        product, 24, f"Could not change current working directory to: {product.prefix}tmp/kox/updated_files")
+        product, 24, f"Could not change current working directory to: {product.prefix}tmp/kox/updated_files"
+    )
     assert program.install(product, archive, user="nobody") == refusal
     assert product.tree("bin") == before
 
 
 def test_two_names_of_one_file_stay_one_file(program, product, patch_dir):
-    archive = (RawArchive(PATCH).file("updated_files/bin/first")
-               .hard_link("updated_files/bin/second", "updated_files/bin/first").write(patch_dir))
+    archive = (
+        RawArchive(PATCH)
+        .file("updated_files/bin/first")
+        .hard_link("updated_files/bin/second", "updated_files/bin/first")
+        .write(patch_dir)
+    )
     assert program.install(product, archive) == INSTALLED
     assert os.path.samefile(product.path / "bin/first", product.path / "bin/second")
     assert product.tree("bin")["bin/first"][:2] == ("file", 0o755)
@@ -124,8 +133,12 @@ def test_a_hard_link_cannot_reach_a_file_outside(program, product, patch_dir, sc
 
 def test_of_two_members_of_one_name_the_last_one_counts(program, product, patch_dir):
     second = Patch("ox", name="second")
-    archive = (RawArchive(PATCH).file("updated_files/bin/tool", "first\n")
-               .file("updated_files/bin/tool", "second\n").file("patch.ini", second.descriptor_text())).write(patch_dir)
+    archive = (
+        RawArchive(PATCH)
+        .file("updated_files/bin/tool", "first\n")
+        .file("updated_files/bin/tool", "second\n")
+        .file("patch.ini", second.descriptor_text())
+    ).write(patch_dir)
     assert program.install(product, archive) == INSTALLED
     assert product.read("bin/tool") == b"second\n"
     assert [line.name for line in product.history()] == ["second"]

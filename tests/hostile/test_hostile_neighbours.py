@@ -52,7 +52,7 @@ for name in names:
     if name == names[0]:
         print("acted", flush=True)
 """
-REPLACE = FOLLOW.replace("METHOD", "replace")    # quicker, where the name may be missing for a moment
+REPLACE = FOLLOW.replace("METHOD", "replace")  # quicker, where the name may be missing for a moment
 EXCHANGE = FOLLOW.replace("METHOD", "exchange")  # in one step
 
 # Takes the names of the files in the new directory before they come, with bits that are worth inheriting.
@@ -81,8 +81,14 @@ class Neighbour:
 
     def __init__(self, script, *arguments):
         self._process = subprocess.Popen(
-            ["/usr/bin/python3", "-c", script, *map(str, arguments)], cwd="/", user="nobody", group=NOBODY,
-            extra_groups=[], stdin=subprocess.DEVNULL, stdout=subprocess.PIPE)
+            ["/usr/bin/python3", "-c", script, *map(str, arguments)],
+            cwd="/",
+            user="nobody",
+            group=NOBODY,
+            extra_groups=[],
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.PIPE,
+        )
 
     def __enter__(self):
         self.expect(b"begun\n")

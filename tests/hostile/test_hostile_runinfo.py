@@ -11,7 +11,7 @@ RUN_INFO = "config/.ConfigData/RunInfo"
 MEGABYTE = 1 << 20
 HOST = os.uname().nodename
 NONE_RUNNING = b"No instances of running dependent agents to stop or restart.\n\n"
-HEADING = (b"The following agent instances will be stopped during the patch application and restarted afterwards:\n")
+HEADING = b"The following agent instances will be stopped during the patch application and restarted afterwards:\n"
 
 
 @pytest.fixture
@@ -34,6 +34,7 @@ def listed(program, product, patch_dir):
             return []
         names = result.out.split(HEADING)[1].split(b"\n\n")[0].split(b"\n")
         return [name.removeprefix(b"    ").removesuffix(b"D").removesuffix(b" instance of ") for name in names]
+
     return report
 
 
@@ -41,8 +42,9 @@ def row(pid, instance, separator=b"|", code=b"ox", host=HOST):
     return separator.join([host.encode(), code, str(pid).encode(), instance, b"x"]) + b"\n"
 
 
-@pytest.mark.parametrize("content", [
-    b"", b"\n\n\n", b"\0", b"FIELDSEP", b"FIELDSEP=", b"FIELDSEP==", b"=|", b"|"], ids=repr)
+@pytest.mark.parametrize(
+    "content", [b"", b"\n\n\n", b"\0", b"FIELDSEP", b"FIELDSEP=", b"FIELDSEP==", b"=|", b"|"], ids=repr
+)
 def test_without_a_separator_nothing_runs(listed, live, content):
     assert listed(content + b"\n" + row(live, b"one")) == []
 
@@ -75,8 +77,18 @@ def test_any_byte_in_the_name_of_an_instance(listed, live, scratch):
 
 def test_lines_of_a_megabyte(listed, live):
     long = b"x" * MEGABYTE
-    content = (b"FIELDSEP=|\n" + long + b"\n" + row(live, b"one", host=HOST + "x" * MEGABYTE) + row(long.decode(), b"two")
-               + row(live, b"three", code=long) + row(live, b"four").rstrip() + long + b"\n" + b"|" * MEGABYTE)
+    content = (
+        b"FIELDSEP=|\n"
+        + long
+        + b"\n"
+        + row(live, b"one", host=HOST + "x" * MEGABYTE)
+        + row(long.decode(), b"two")
+        + row(live, b"three", code=long)
+        + row(live, b"four").rstrip()
+        + long
+        + b"\n"
+        + b"|" * MEGABYTE
+    )
     assert listed(content) == [b"one", b"four"]
 
 
@@ -90,9 +102,31 @@ def test_a_million_lines(listed, live):
 
 
 HOSTILE_PIDS = [
-    "$(touch {mark})", "`touch {mark}`", ";touch {mark}", "&touch {mark}", "1;touch {mark}", "{live};touch {mark}",
-    "{live}>{mark}", "-1", "-e", "--help", "-p 1", "{live},1", "{live}x", "x{live}", "+{live}", "0x1", "0", "%n%s",
-    "99999999999999999999", "' '", "*", "{live} ", "{live}\t", "PID"]
+    "$(touch {mark})",
+    "`touch {mark}`",
+    ";touch {mark}",
+    "&touch {mark}",
+    "1;touch {mark}",
+    "{live};touch {mark}",
+    "{live}>{mark}",
+    "-1",
+    "-e",
+    "--help",
+    "-p 1",
+    "{live},1",
+    "{live}x",
+    "x{live}",
+    "+{live}",
+    "0x1",
+    "0",
+    "%n%s",
+    "99999999999999999999",
+    "' '",
+    "*",
+    "{live} ",
+    "{live}\t",
+    "PID",
+]
 
 
 @pytest.mark.parametrize("pid", HOSTILE_PIDS)
@@ -101,10 +135,13 @@ def test_a_process_id_that_is_none_never_reaches_a_shell(listed, product, live, 
     pid = pid.format(mark=mark, live=live)
     assert listed(b"FIELDSEP=|\n" + row(pid, b"one")) == []
     assert not mark.exists()
-    words = [message.split(": ", 1)[1] for message in product.log().messages("TRACE", "process.cpp")
-             if message.startswith("cmdArray[")]
+    words = [
+        message.split(": ", 1)[1]
+        for message in product.log().messages("TRACE", "process.cpp")
+        if message.startswith("cmdArray[")
+    ]
     at = words.index("ps")
-    assert words[at:at + 3] == ["ps", "-p", pid]
+    assert words[at : at + 3] == ["ps", "-p", pid]
     assert "/bin/sh" not in words
 
 
@@ -135,10 +172,18 @@ def test_a_name_like_an_option_is_an_argument_of_the_control_script(program, pro
     assert product.calls() == ["QuillAgent -o --version stop yn", "QuillAgent -o --version start yn"]
 
 
-@pytest.mark.parametrize("make", [os.mkfifo, os.mkdir, lambda path: os.symlink("/dev/zero", path),
-                                  lambda path: os.symlink("/nonexistent", path), lambda path: None,
-                                  lambda path: (path.touch(), os.truncate(path, 1 << 40))],
-                         ids=["fifo", "directory", "device", "dangling link", "missing", "a terabyte"])
+@pytest.mark.parametrize(
+    "make",
+    [
+        os.mkfifo,
+        os.mkdir,
+        lambda path: os.symlink("/dev/zero", path),
+        lambda path: os.symlink("/nonexistent", path),
+        lambda path: None,
+        lambda path: (path.touch(), os.truncate(path, 1 << 40)),
+    ],
+    ids=["fifo", "directory", "device", "dangling link", "missing", "a terabyte"],
+)
 def test_run_information_that_is_no_readable_file_means_that_nothing_runs(program, product, patch_dir, make):
     product.remove(RUN_INFO)
     make(product.path / RUN_INFO)

@@ -22,7 +22,7 @@ def seen(result, closed):
 
 @pytest.fixture
 def patch(patch_dir):
-    look = 'readlink -v /proc/$$/fd/0 /proc/$PPID/fd/0 /proc/$PPID/fd/1 /proc/$PPID/fd/2; echo cried >&2'
+    look = "readlink -v /proc/$$/fd/0 /proc/$PPID/fd/0 /proc/$PPID/fd/1 /proc/$PPID/fd/2; echo cried >&2"
     return Patch("ox").file("bin/tool").script("look.sh", "post", body=look).write(patch_dir)
 
 
@@ -70,8 +70,13 @@ def test_the_log_on_standard_output_does_not_land_in_a_file(program, product, pa
 
 
 def run_with(program, product, patch, env=None, **streams):
-    return subprocess.run([*program.argv, "-h", product.path, "-i", patch], timeout=60, check=False,
-                          env={**os.environ, **(env or {})}, **streams)
+    return subprocess.run(
+        [*program.argv, "-h", product.path, "-i", patch],
+        timeout=60,
+        check=False,
+        env={**os.environ, **(env or {})},
+        **streams,
+    )
 
 
 @pytest.mark.parametrize("env", [{}, {"PATCH_DEBUG": "1"}], ids=["log in its file", "log on standard output"])
@@ -87,14 +92,23 @@ def test_a_reader_that_has_gone_stops_nothing(program, product, patch, stream, e
     assert [line.result for line in product.history()] == ["PASS"]
 
 
-@pytest.mark.parametrize("wrapper, status", [
-    ((), b"141\n"),  # 128 + SIGPIPE: not ignored
-    (("/bin/sh", "-c", 'trap "" PIPE; exec "$@"', "sh"), b"1\n")],  # it reads of the error instead
-    ids=["default", "ignored"])
+@pytest.mark.parametrize(
+    "wrapper, status",
+    [
+        ((), b"141\n"),  # 128 + SIGPIPE: not ignored
+        (("/bin/sh", "-c", 'trap "" PIPE; exec "$@"', "sh"), b"1\n"),
+    ],  # it reads of the error instead
+    ids=["default", "ignored"],
+)
 def test_a_command_of_a_patch_is_told_of_a_reader_that_has_gone_as_the_caller_would_be(
-        program, product, patch_dir, wrapper, status):
-    archive = Patch("ox").file("bin/tool").script(
-        "look.sh", "post", body='(yes 2>/dev/null; echo $? >"$QUILLHOME/status") | head -1').write(patch_dir)
+    program, product, patch_dir, wrapper, status
+):
+    archive = (
+        Patch("ox")
+        .file("bin/tool")
+        .script("look.sh", "post", body='(yes 2>/dev/null; echo $? >"$QUILLHOME/status") | head -1')
+        .write(patch_dir)
+    )
     assert program.install(product, archive, wrapper=wrapper) == INSTALLED
     assert product.read("status") == status
 
@@ -102,8 +116,13 @@ def test_a_command_of_a_patch_is_told_of_a_reader_that_has_gone_as_the_caller_wo
 @pytest.mark.parametrize("stream", ["stdout", "stderr"])
 def test_a_full_device_stops_nothing(program, product, patch, stream):
     with open("/dev/full", "wb") as full:
-        done = run_with(program, product, patch, {"PATCH_DEBUG": "1"},
-                        **{"stdout": subprocess.DEVNULL, "stderr": subprocess.DEVNULL, stream: full})
+        done = run_with(
+            program,
+            product,
+            patch,
+            {"PATCH_DEBUG": "1"},
+            **{"stdout": subprocess.DEVNULL, "stderr": subprocess.DEVNULL, stream: full},
+        )
     assert done.returncode == 0
     assert [line.result for line in product.history()] == ["PASS"]
 
@@ -112,8 +131,13 @@ def test_a_limit_on_the_size_of_files_costs_the_log_only(program, product, patch
     # The log is beyond the limit from the start; what the patch itself writes is not.
     product.write("patchlogs/orvpatch.log", b"x" * 100000)
     archive = Patch("ox").file("bin/tool").write(patch_dir)
-    done = run_with(program, product, archive, stdout=subprocess.PIPE,
-                    preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (50000, 50000)))
+    done = run_with(
+        program,
+        product,
+        archive,
+        stdout=subprocess.PIPE,
+        preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (50000, 50000)),
+    )
     assert (done.returncode, done.stdout) == (0, SUCCESS)
     assert product.read("bin/tool") == b"new\n"
     assert product.read("patchlogs/orvpatch.log") == b"x" * 100000
@@ -131,8 +155,15 @@ def test_an_archive_beyond_the_limit_on_the_size_of_files_installs_nothing(progr
 
 def test_many_inherited_descriptors_are_left_alone(program, product, patch):
     read_end, write_end = os.pipe()
-    done = run_with(program, product, patch, stdout=subprocess.PIPE, stderr=subprocess.PIPE,
-                    pass_fds=[write_end], stdin=subprocess.DEVNULL)
+    done = run_with(
+        program,
+        product,
+        patch,
+        stdout=subprocess.PIPE,
+        stderr=subprocess.PIPE,
+        pass_fds=[write_end],
+        stdin=subprocess.DEVNULL,
+    )
     os.close(write_end)
     assert (done.returncode, done.stdout, done.stderr) == INSTALLED
     assert os.read(read_end, 1) == b""

@@ -17,9 +17,17 @@ NOBODY = 65534
 
 
 def as_nobody(script, *arguments, **options):
-    return subprocess.Popen(["/bin/sh", "-c", script, "sh", *map(str, arguments)], cwd="/", user="nobody",
-                            group=NOBODY, extra_groups=[], stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-                            stderr=subprocess.DEVNULL, **options)
+    return subprocess.Popen(
+        ["/bin/sh", "-c", script, "sh", *map(str, arguments)],
+        cwd="/",
+        user="nobody",
+        group=NOBODY,
+        extra_groups=[],
+        stdin=subprocess.DEVNULL,
+        stdout=subprocess.DEVNULL,
+        stderr=subprocess.DEVNULL,
+        **options,
+    )
 
 
 def await_file(path, seconds=30):
@@ -80,7 +88,9 @@ def test_a_report_makes_set_id_files_for_its_duration(program, product, patch_di
 
 def test_descriptors_of_the_caller_are_open_in_every_child_unless_closed(program, product, patch_dir):
     product.start("ox")
-    archive = Patch("ox").script("a.sh", "pre", body='[ ! -e /proc/self/fd/9 ] || touch "$QUILLHOME/open"').write(patch_dir)
+    archive = (
+        Patch("ox").script("a.sh", "pre", body='[ ! -e /proc/self/fd/9 ] || touch "$QUILLHOME/open"').write(patch_dir)
+    )
     assert program.install(product, archive, wrapper=["sh", "-c", 'exec "$@" 9</dev/null', "sh"]) == INSTALLED
     assert product.exists("open")
     product.remove("open")
@@ -100,12 +110,18 @@ printf '#!/bin/sh\\nid -u >"$QUILLHOME/mark"\\n' >"$1/tmp/kox/mine" && chmod 755
 
 @pytest.mark.needs_root
 @pytest.mark.parametrize("mode, taken_over", [(0o755, True), (0o777, True), (0o1777, True), (0o700, False)])
-def test_a_user_who_may_enter_tmp_can_replace_a_command_that_runs_next(
-        program, product, patch_dir, mode, taken_over):
+def test_a_user_who_may_enter_tmp_can_replace_a_command_that_runs_next(program, product, patch_dir, mode, taken_over):
     product.mkdir("tmp", mode)
-    archive = Patch("ox").script(
-        "1_wait.sh", "pre_patch", body='touch "$QUILLHOME/waiting"; while [ ! -e "$QUILLHOME/go" ]; do sleep 0.02; done',
-    ).script("2_next.sh", "pre_patch", body='echo harmless >"$QUILLHOME/mark"').write(patch_dir)
+    archive = (
+        Patch("ox")
+        .script(
+            "1_wait.sh",
+            "pre_patch",
+            body='touch "$QUILLHOME/waiting"; while [ ! -e "$QUILLHOME/go" ]; do sleep 0.02; done',
+        )
+        .script("2_next.sh", "pre_patch", body='echo harmless >"$QUILLHOME/mark"')
+        .write(patch_dir)
+    )
     results = []
     running = threading.Thread(target=lambda: results.append(program.install(product, archive)))
     running.start()
@@ -134,13 +150,15 @@ def set_attribute(path, name, value):
 
 # a capability set of version 2 that holds net_bind_service; a list of two more entries than the mode has
 CAPABILITY = struct.pack("<5I", 0x02000001, 1 << 10, 0, 0, 0)
-ACCESS_LIST = struct.pack("<I" + "HHI" * 5, 2, 1, 6, 0xFFFFFFFF, 2, 7, 1, 4, 4, 0xFFFFFFFF, 16, 7, 0xFFFFFFFF,
-                          32, 4, 0xFFFFFFFF)
+ACCESS_LIST = struct.pack(
+    "<I" + "HHI" * 5, 2, 1, 6, 0xFFFFFFFF, 2, 7, 1, 4, 4, 0xFFFFFFFF, 16, 7, 0xFFFFFFFF, 32, 4, 0xFFFFFFFF
+)
 
 
 @pytest.mark.needs_root
-@pytest.mark.parametrize("name, value", [
-    ("security.capability", CAPABILITY), ("system.posix_acl_access", ACCESS_LIST), ("user.label", b"x")])
+@pytest.mark.parametrize(
+    "name, value", [("security.capability", CAPABILITY), ("system.posix_acl_access", ACCESS_LIST), ("user.label", b"x")]
+)
 def test_a_replaced_file_loses_its_further_attributes(program, product, patch_dir, name, value):
     tool = product.write("bin/tool", "old", 0o755)
     set_attribute(tool, name, value)
@@ -155,6 +173,7 @@ def test_further_links_to_a_replaced_file_keep_the_old_content(program, product,
 
 
 # --- other processes on the host ---------------------------------------------------------------------------
+
 
 def await_command_line(process, text):
     limit = time.monotonic() + 30
@@ -183,8 +202,11 @@ def test_any_user_can_become_the_owner_of_a_process_in_the_tools_eyes(program, p
     finally:
         bait.kill()
         bait.wait()
-    words = [message.split(": ", 1)[1] for message in product.log().messages("TRACE", "process.cpp")
-             if message.startswith("cmdArray[")]
+    words = [
+        message.split(": ", 1)[1]
+        for message in product.log().messages("TRACE", "process.cpp")
+        if message.startswith("cmdArray[")
+    ]
     assert words[-5:] == ["/bin/su", "-", "nobody", "-c", f"{product.prefix}bin/QuillAgent  start yn"]
     assert result.status == 12  # the account has no shell to start it with
 
@@ -226,8 +248,9 @@ def test_ps_format_hides_running_instances(program, product, patch_dir):
     assert product.calls() == []
 
 
-@pytest.mark.parametrize("variable", [
-    {"COLUMNS": "60"}, {"PS_PERSONALITY": "old"}, {"CMD_ENV": "old"}, {"I_WANT_A_BROKEN_PS": "1"}], ids=str)
+@pytest.mark.parametrize(
+    "variable", [{"COLUMNS": "60"}, {"PS_PERSONALITY": "old"}, {"CMD_ENV": "old"}, {"I_WANT_A_BROKEN_PS": "1"}], ids=str
+)
 def test_what_hides_a_running_console(program, product, patch_dir, variable):
     product.component("zt")
     product.start_console()
@@ -274,9 +297,20 @@ def test_the_language_is_that_of_the_children_only(program, product, patch_dir):
     assert "Nicht im Archiv gefunden" in "".join(product.log().messages("TRACE", "patchprocessor"))
 
 
-@pytest.mark.parametrize("variable", [
-    {"POSIXLY_CORRECT": "1"}, {"LC_ALL": "C.UTF-8"}, {"LC_ALL": "xx_YY"}, {"IFS": "p"}, {"QUILLHOME": "/nonexistent/"},
-    {"ENV": "/nonexistent", "BASH_ENV": "/nonexistent"}, {"UNIX95": "1"}, {"TMPDIR": "/nonexistent"}], ids=str)
+@pytest.mark.parametrize(
+    "variable",
+    [
+        {"POSIXLY_CORRECT": "1"},
+        {"LC_ALL": "C.UTF-8"},
+        {"LC_ALL": "xx_YY"},
+        {"IFS": "p"},
+        {"QUILLHOME": "/nonexistent/"},
+        {"ENV": "/nonexistent", "BASH_ENV": "/nonexistent"},
+        {"UNIX95": "1"},
+        {"TMPDIR": "/nonexistent"},
+    ],
+    ids=str,
+)
 def test_variables_that_change_nothing(program, product, patch_dir, variable):
     product.start("ox")
     assert program.install(product, Patch("ox").file("bin/tool").write(patch_dir), env=variable) == INSTALLED

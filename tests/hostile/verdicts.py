@@ -10,8 +10,11 @@ _WRITTEN_BY_ANY_RUN = ("patchlogs/orvpatch.log", "patchlogs/patches.hist", "tmp/
 
 
 def failure(home):
-    return (b"\nCommand completed with errors. For more information, see the orvpatch.log file under:\n"
-            + home.prefix.encode() + b"patchlogs/\n\n")
+    return (
+        b"\nCommand completed with errors. For more information, see the orvpatch.log file under:\n"
+        + home.prefix.encode()
+        + b"patchlogs/\n\n"
+    )
 
 
 def refused(home, status, text, out=b""):
@@ -21,8 +24,7 @@ def refused(home, status, text, out=b""):
 
 def product_tree(home):
     """The home without what any run may write: unchanged when a patch was refused."""
-    return {path: entry for path, entry in home.tree().items()
-            if not path.startswith(_WRITTEN_BY_ANY_RUN)}
+    return {path: entry for path, entry in home.tree().items() if not path.startswith(_WRITTEN_BY_ANY_RUN)}
 
 
 def added(before, after):

@@ -24,13 +24,10 @@ MOMENTS = {  # UTC -> how the header shows it
 def test_it_is_that_of_source_date_epoch(tmp_path, moment, zone):
     shown = tmp_path / "show.cmake"
     shown.write_text(
-        f'include("{SCRIPT}")\n'
-        f'file(WRITE "{tmp_path}/shown" "${{ORVPATCH_BUILD_DATE}} ${{ORVPATCH_BUILD_TIME}}")\n'
+        f'include("{SCRIPT}")\n' f'file(WRITE "{tmp_path}/shown" "${{ORVPATCH_BUILD_DATE}} ${{ORVPATCH_BUILD_TIME}}")\n'
     )
     epoch = str(int(datetime(*moment, tzinfo=timezone.utc).timestamp()))
-    subprocess.run(
-        ["cmake", "-P", shown], check=True, env={**os.environ, "SOURCE_DATE_EPOCH": epoch, "TZ": zone}
-    )
+    subprocess.run(["cmake", "-P", shown], check=True, env={**os.environ, "SOURCE_DATE_EPOCH": epoch, "TZ": zone})
     assert (tmp_path / "shown").read_text() == MOMENTS[moment]
 
 

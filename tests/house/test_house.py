@@ -102,11 +102,7 @@ def test_sources_log_through_the_macros_only(path):
 
 
 def slugs_in(paths):
-    return {
-        slug
-        for path in paths
-        for slug in re.findall(r"KEEP\(([a-z0-9-]+)\)", path.read_text(errors="replace"))
-    }
+    return {slug for path in paths for slug in re.findall(r"KEEP\(([a-z0-9-]+)\)", path.read_text(errors="replace"))}
 
 
 def test_every_oddity_is_documented_and_held_by_a_test():

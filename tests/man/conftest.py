@@ -66,8 +66,16 @@ class Example:
         """Runs a session in one shell. Every command must succeed, and where the session shows output, each
         must print what is shown, nothing included. Returns what was printed."""
         script = "".join(f"{self.real(step.command)}\nprintf '{_MARK}%d{_MARK}' $?\n" for step in steps)
-        done = subprocess.run(["bash", "-c", script], cwd=self.here, env=self.environment, text=True,
-                              stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, timeout=60)
+        done = subprocess.run(
+            ["bash", "-c", script],
+            cwd=self.here,
+            env=self.environment,
+            text=True,
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.PIPE,
+            stderr=subprocess.STDOUT,
+            timeout=60,
+        )
         pieces = done.stdout.split(_MARK)
         outputs, statuses = pieces[:-1:2], pieces[1::2]
         assert statuses == ["0"] * len(steps), done.stdout

@@ -9,7 +9,9 @@ from pathlib import Path
 from typing import NamedTuple
 
 FOLDER = Path(__file__).resolve().parents[2] / "man"
-_BLOCK = re.compile(r'(?:^\.\\" (session|file (?P<path>\S+))\n)?^\.Bd -literal[^\n]*\n(?P<text>.*?)^\.Ed\n', re.M | re.S)
+_BLOCK = re.compile(
+    r'(?:^\.\\" (session|file (?P<path>\S+))\n)?^\.Bd -literal[^\n]*\n(?P<text>.*?)^\.Ed\n', re.M | re.S
+)
 _ESCAPES = {r"\e": "\\", r"\&": ""}
 
 

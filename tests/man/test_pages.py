@@ -137,8 +137,12 @@ def test_command_with_arguments_by_a_script_of_its_own(example):
     example.install_products()
     patch = fix_pack("06100002", "fp0002").script("second.sh").member("20-second.sh", wrapper, 0o755)
     patch.command("pre", "20-second.sh").write(example.here)
-    status = subprocess.run(["orvpatch", "-h", example.home.path, "-i", patch.filename], cwd=example.here,
-                            env=example.environment, stdout=subprocess.DEVNULL).returncode
+    status = subprocess.run(
+        ["orvpatch", "-h", example.home.path, "-i", patch.filename],
+        cwd=example.here,
+        env=example.environment,
+        stdout=subprocess.DEVNULL,
+    ).returncode
     assert (status, example.home.calls()) == (0, ["second.sh --level=2"])
 
 

@@ -41,8 +41,7 @@ class Memcheck:
         (main,) = [text for text in reports.values() if _number(r"Parent PID: (\d+)", text) not in reports]
         assert "ERROR SUMMARY" in main, main
         lost = sum(
-            _number(rf"{kind} lost: ([\d,]+) bytes", main) or 0
-            for kind in ("definitely", "indirectly", "possibly")
+            _number(rf"{kind} lost: ([\d,]+) bytes", main) or 0 for kind in ("definitely", "indirectly", "possibly")
         )
         return Report(_number(r"ERROR SUMMARY: ([\d,]+)", main), lost, self._descriptors(main), main)
 
@@ -52,9 +51,7 @@ class Memcheck:
     def _descriptors(self, text):
         # Valgrind's own log is one of them; what a caller left open is none of the program's.
         opened = re.findall(r"Open (?:file descriptor|\S+ socket) (\d+): ?(.*)\n==\d+==    (.*)", text)
-        return [
-            f"{number} {path} {where}" for number, path, where in opened if where != "<inherited from parent>"
-        ]
+        return [f"{number} {path} {where}" for number, path, where in opened if where != "<inherited from parent>"]
 
     def _reports(self):
         files = self._folder.glob("memcheck.*")

@@ -48,9 +48,7 @@ def product(home):
 
 def whole_patch():
     return (
-        Patch(
-            "yn", level="06100200", prereqs={"ox": "061000"}, dependents=["ox", "qa", "wn"], exe="agent.exe"
-        )
+        Patch("yn", level="06100200", prereqs={"ox": "061000"}, dependents=["ox", "qa", "wn"], exe="agent.exe")
         .file("bin/agent")
         .file("new/sub/file")
         .file("bin/QuillHelp", "x")

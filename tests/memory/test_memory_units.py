@@ -8,9 +8,7 @@ from memcheck import Memcheck
 
 
 @pytest.mark.memory
-@pytest.mark.parametrize(
-    "name, part, parts", [("unit_tests", 0, 2), ("unit_tests", 1, 2), ("wrapped_tests", 0, 1)]
-)
+@pytest.mark.parametrize("name, part, parts", [("unit_tests", 0, 2), ("unit_tests", 1, 2), ("wrapped_tests", 0, 1)])
 def test_unit_tests(program, scratch, name, part, parts):
     memcheck = Memcheck(scratch)
     shard = {"GTEST_TOTAL_SHARDS": str(parts), "GTEST_SHARD_INDEX": str(part)}

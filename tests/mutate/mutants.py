@@ -14,12 +14,12 @@ SURVIVORS = Path(__file__).with_name("survivors.txt")
 
 class Mutant(NamedTuple):
     file: str
-    line: int       # counted from 1
-    function: str   # in which it stands, or the file's own name
+    line: int  # counted from 1
+    function: str  # in which it stands, or the file's own name
     kind: str
-    change: str     # in short, without the line
-    nth: int        # among those of the function that read the same
-    before: str     # text of the line, or of the lines
+    change: str  # in short, without the line
+    nth: int  # among those of the function that read the same
+    before: str  # text of the line, or of the lines
     after: str
 
     @property
@@ -28,13 +28,35 @@ class Mutant(NamedTuple):
         return f"{self.file} {self.function} [{self.kind}] {self.change}{f' #{self.nth}' if self.nth > 1 else ''}"
 
 
-OPERATORS = [("==", "!="), ("!=", "=="), ("<=", "<"), (">=", ">"), (" < ", " <= "), (" > ", " >= "),
-             (" && ", " || "), (" || ", " && "), (" + ", " - "), (" - ", " + "), ("+= ", "= "), ("++i", "--i"),
-             ("!", "")]
+OPERATORS = [
+    ("==", "!="),
+    ("!=", "=="),
+    ("<=", "<"),
+    (">=", ">"),
+    (" < ", " <= "),
+    (" > ", " >= "),
+    (" && ", " || "),
+    (" || ", " && "),
+    (" + ", " - "),
+    (" - ", " + "),
+    ("+= ", "= "),
+    ("++i", "--i"),
+    ("!", ""),
+]
 # Operations that take the place of each other.
-NEIGHBOURS = [("find", "rfind"), ("find_first_of", "find_last_of"), ("find_first_not_of", "find_last_not_of"),
-              ("front", "back"), ("stat", "lstat"), ("min", "max"), ("lower_bound", "upper_bound"),
-              ("first", "second"), ("append", "assign"), ("any_of", "all_of"), ("O_APPEND", "O_TRUNC")]
+NEIGHBOURS = [
+    ("find", "rfind"),
+    ("find_first_of", "find_last_of"),
+    ("find_first_not_of", "find_last_not_of"),
+    ("front", "back"),
+    ("stat", "lstat"),
+    ("min", "max"),
+    ("lower_bound", "upper_bound"),
+    ("first", "second"),
+    ("append", "assign"),
+    ("any_of", "all_of"),
+    ("O_APPEND", "O_TRUNC"),
+]
 NEIGHBOUR = {name: other for pair in NEIGHBOURS for name, other in (pair, pair[::-1])}
 CONSTANTS = {"true": "false", "false": "true"}
 WORD = re.compile(r"(?<![\w.\"])[A-Za-z_]\w*|(?<=[.>])[A-Za-z_]\w*")
@@ -61,12 +83,12 @@ def code_part(line):
     """The line without a comment at its end."""
     for match in re.finditer(r"//", line):
         if outside_strings(line, match.start()):
-            return line[:match.start()].rstrip()
+            return line[: match.start()].rstrip()
     return line
 
 
 def replaced(line, span, text):
-    return line[:span[0]] + text + line[span[1]:]
+    return line[: span[0]] + text + line[span[1] :]
 
 
 def operator_mutants(line):
@@ -75,7 +97,7 @@ def operator_mutants(line):
             end = match.end()
             if not outside_strings(line, match.start()):
                 continue
-            if old == "!" and (line[end:end + 1] == "=" or not line[end:end + 1].strip()):
+            if old == "!" and (line[end : end + 1] == "=" or not line[end : end + 1].strip()):
                 continue
             yield "operator", f"{old.strip()} -> {new.strip()}", replaced(line, match.span(), new)
     if " ? " in line:
@@ -87,10 +109,14 @@ def word_mutants(line):
     for match in WORD.finditer(line):
         word = match.group()
         new = CONSTANTS.get(word) or NEIGHBOUR.get(word)
-        if new and outside_strings(line, match.start()) and (word in CONSTANTS or word.isupper()
-                                                             or line[match.end():match.end() + 1] in ("(", ".", "")):
+        if (
+            new
+            and outside_strings(line, match.start())
+            and (word in CONSTANTS or word.isupper() or line[match.end() : match.end() + 1] in ("(", ".", ""))
+        ):
             yield ("constant" if word in CONSTANTS else "neighbour"), f"{word} -> {new}", replaced(
-                line, match.span(), new)
+                line, match.span(), new
+            )
     for match in NUMBER.finditer(line):
         if outside_strings(line, match.start()):
             new = str(int(match.group(1)) + 1)
@@ -113,16 +139,17 @@ def argument_mutants(line):
             continue
         words = match.group(2).split(", ")
         for at in range(1 if match.group(1).startswith("LOG_") else 0, len(words) - 1):
-            swapped = [*words[:at], words[at + 1], words[at], *words[at + 2:]]
+            swapped = [*words[:at], words[at + 1], words[at], *words[at + 2 :]]
             if swapped != words:
                 yield "argument", f"{match.group(1)}: {at + 1} and {at + 2} swapped", replaced(
-                    line, match.span(2), ", ".join(swapped))
+                    line, match.span(2), ", ".join(swapped)
+                )
 
 
 def variable_mutants(line, variables):
     """One variable for another of its type; `variables`: name -> the others."""
     for match in WORD.finditer(line):
-        if outside_strings(line, match.start()) and not re.match(r"\s*(=|\{) ", line[match.end():]):
+        if outside_strings(line, match.start()) and not re.match(r"\s*(=|\{) ", line[match.end() :]):
             for other in variables.get(match.group(), ()):
                 yield "variable", f"{match.group()} -> {other}", replaced(line, match.span(), other)
 
@@ -199,7 +226,7 @@ def sample(root, count, seed):
 def apply(mutant, text):
     lines = text.splitlines()
     height = mutant.before.count("\n") + 1
-    lines[mutant.line - 1:mutant.line - 1 + height] = mutant.after.split("\n")
+    lines[mutant.line - 1 : mutant.line - 1 + height] = mutant.after.split("\n")
     return "\n".join(lines) + "\n"
 
 

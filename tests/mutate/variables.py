@@ -3,8 +3,10 @@
 import re
 from collections import defaultdict
 
-_TYPES = (r"std::string|std::vector<std::string>|int|bool|long|mode_t|uid_t|gid_t|pid_t|size_t|std::size_t|"
-          r"std::string_view|struct stat|char|File|FileDescriptor|Version|ProcessResult")
+_TYPES = (
+    r"std::string|std::vector<std::string>|int|bool|long|mode_t|uid_t|gid_t|pid_t|size_t|std::size_t|"
+    r"std::string_view|struct stat|char|File|FileDescriptor|Version|ProcessResult"
+)
 _DECLARED = re.compile(rf"(?:const )?\b({_TYPES})\b(?: const)? ?([*&]?)(?:const )?(\w+)(?=[,;)=\[{{]| = |\))")
 
 
@@ -25,7 +27,7 @@ def _function_before(lines, number):
         first -= 1
     while first > 0 and lines[first - 1][:1].strip() and not lines[first - 1].startswith(("}", "//", "#")):
         first -= 1
-    return lines[first:number - 1] if first < number - 1 else []
+    return lines[first : number - 1] if first < number - 1 else []
 
 
 def _members(path):

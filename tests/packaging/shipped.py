@@ -14,8 +14,20 @@ from typing import NamedTuple
 CHECKOUT = Path(__file__).resolve().parents[2]
 VERSION = "1.0.0~git20261121.0123456789ab"  # as of a commit between two releases
 EPOCH = 1795219200  # any moment; not that of a checkout or a build
-_SHIPPED = ["CMakeLists.txt", "CMakePresets.json", "cmake", "completions", "ctl", "docs", "man", "packaging", "src",
-            "CHANGELOG.md", "README.md", "SECURITY.md"]
+_SHIPPED = [
+    "CMakeLists.txt",
+    "CMakePresets.json",
+    "cmake",
+    "completions",
+    "ctl",
+    "docs",
+    "man",
+    "packaging",
+    "src",
+    "CHANGELOG.md",
+    "README.md",
+    "SECURITY.md",
+]
 
 
 # The libraries of the first build; other builds get copies of them, in folders of their own.
@@ -43,18 +55,32 @@ PROGRAMS = ("orvpatch", "orvpatchctl")
 # What orvpatchctl runs with under emulation: libarchive and its libraries, and a C library that they accept.
 _RUN_SYSROOT = SYSROOTS / "ppc64le-run"
 AMD64 = Architecture(
-    "x86_64", "amd64", "x86_64-linux-gnu", "Advanced Micro Devices X86-64",
-    frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}), {"orvpatch": "2.14", "orvpatchctl": "2.17"},
+    "x86_64",
+    "amd64",
+    "x86_64-linux-gnu",
+    "Advanced Micro Devices X86-64",
+    frozenset({"libc.so.6", "ld-linux-x86-64.so.2"}),
+    {"orvpatch": "2.14", "orvpatchctl": "2.17"},
     (f"{_AMD64_LIBRARIES}/ld-linux-x86-64.so.2", "--library-path", _AMD64_LIBRARIES),
     (),
-    ("{p}-{v}-linux-x86_64-debug.tar.gz", "{p}-{v}-linux-x86_64.tar.gz", "{p}_{v}-1_amd64.deb"))
+    ("{p}-{v}-linux-x86_64-debug.tar.gz", "{p}-{v}-linux-x86_64.tar.gz", "{p}_{v}-1_amd64.deb"),
+)
 PPC64LE = Architecture(
-    "ppc64le", "ppc64el", "powerpc64le-linux-gnu", "PowerPC64", frozenset({"libc.so.6", "ld64.so.2"}),
+    "ppc64le",
+    "ppc64el",
+    "powerpc64le-linux-gnu",
+    "PowerPC64",
+    frozenset({"libc.so.6", "ld64.so.2"}),
     {"orvpatch": "2.17", "orvpatchctl": "2.17"},
     ("qemu-ppc64le", "-L", f"{SYSROOTS}/ppc64le/usr/powerpc64le-linux-gnu"),
     ("qemu-ppc64le", "-L", str(_RUN_SYSROOT)),
-    ("{p}-{v}-1.ppc64le.rpm", "{p}-{v}-linux-ppc64le-debug.tar.gz", "{p}-{v}-linux-ppc64le.tar.gz",
-     "{p}_{v}-1_ppc64el.deb"))
+    (
+        "{p}-{v}-1.ppc64le.rpm",
+        "{p}-{v}-linux-ppc64le-debug.tar.gz",
+        "{p}-{v}-linux-ppc64le.tar.gz",
+        "{p}_{v}-1_ppc64el.deb",
+    ),
+)
 ARCHITECTURES = [AMD64, PPC64LE]
 
 
@@ -94,10 +120,17 @@ def ship(architecture, folder, umask, **environment):
         if not (source / "VERSION").exists():
             (source / "VERSION").write_text(f"{VERSION}\n")
         sysroots = _sysroots(architecture.preset, source)
-        done = subprocess.run(["packaging/pack", architecture.preset], cwd=source, umask=umask, text=True,
-                              stdin=subprocess.DEVNULL, stdout=subprocess.PIPE, stderr=subprocess.STDOUT, check=False,
-                              env={**os.environ, "SOURCE_DATE_EPOCH": str(EPOCH), "ORVPATCH_SYSROOTS": str(sysroots),
-                                   **environment})
+        done = subprocess.run(
+            ["packaging/pack", architecture.preset],
+            cwd=source,
+            umask=umask,
+            text=True,
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.PIPE,
+            stderr=subprocess.STDOUT,
+            check=False,
+            env={**os.environ, "SOURCE_DATE_EPOCH": str(EPOCH), "ORVPATCH_SYSROOTS": str(sysroots), **environment},
+        )
     assert done.returncode == 0, done.stdout
     return Build(architecture, source / "build" / architecture.preset, done.stdout)
 
@@ -134,8 +167,13 @@ def checkout_files(*paths):
     """Names of the files of the checkout below these paths, without what a build makes; a source archive is not under
     version control and has nothing else."""
     if (CHECKOUT / ".git").exists():
-        return subprocess.run(["git", "ls-files", "-co", "--exclude-standard", "--", *paths], cwd=CHECKOUT, check=True,
-                              capture_output=True, text=True).stdout.splitlines()
+        return subprocess.run(
+            ["git", "ls-files", "-co", "--exclude-standard", "--", *paths],
+            cwd=CHECKOUT,
+            check=True,
+            capture_output=True,
+            text=True,
+        ).stdout.splitlines()
     found = [path for name in paths for path in [CHECKOUT / name, *(CHECKOUT / name).rglob("*")]]
     return [str(path.relative_to(CHECKOUT)) for path in found if path.is_file()]
 

@@ -26,8 +26,15 @@ def by_dpkg(build, root):
         (root / "var/lib/dpkg" / folder).mkdir(parents=True)
     for record in ("status", "available"):
         (root / "var/lib/dpkg" / record).touch()
-    run("dpkg", f"--root={root}", "--force-depends", "--force-architecture", "--log=/dev/null", "-i",
-        *(build.package(".deb", name) for name in PROGRAMS))
+    run(
+        "dpkg",
+        f"--root={root}",
+        "--force-depends",
+        "--force-architecture",
+        "--log=/dev/null",
+        "-i",
+        *(build.package(".deb", name) for name in PROGRAMS),
+    )
     for name in PROGRAMS:
         assert "\nStatus: install ok installed\n" in run("dpkg", f"--root={root}", "-s", name)
     return root / "usr"
@@ -58,7 +65,8 @@ def prefix(request, build, tmp_path):
 
 
 in_every_way = pytest.mark.parametrize(
-    "architecture, prefix", WAYS, indirect=True, ids=[f"{arch.preset}-{way.__name__}" for arch, way in WAYS])
+    "architecture, prefix", WAYS, indirect=True, ids=[f"{arch.preset}-{way.__name__}" for arch, way in WAYS]
+)
 
 
 def emulated(runner, program, folder):
@@ -89,8 +97,13 @@ def ctl(prefix, build, tmp_path):
 
     def call(command, *words):
         options = installer if command in ("check", "apply") else []
-        done = subprocess.run([program, command, *words, *options, "--json"], stdin=subprocess.DEVNULL,
-                              capture_output=True, text=True, check=False)
+        done = subprocess.run(
+            [program, command, *words, *options, "--json"],
+            stdin=subprocess.DEVNULL,
+            capture_output=True,
+            text=True,
+            check=False,
+        )
         assert done.stdout, done.stderr
         return done.returncode, json.loads(done.stdout)
 
@@ -135,8 +148,13 @@ def levels_of(ctl, home):
 @in_every_way
 def test_installed_pages_can_be_read(prefix):
     for page in sorted((prefix / "share/man").rglob("*.gz")):
-        done = subprocess.run(["mandoc", "-T", "ascii", page.relative_to(prefix / "share/man")], check=True,
-                              cwd=prefix / "share/man", capture_output=True, text=True)
+        done = subprocess.run(
+            ["mandoc", "-T", "ascii", page.relative_to(prefix / "share/man")],
+            check=True,
+            cwd=prefix / "share/man",
+            capture_output=True,
+            text=True,
+        )
         assert "ORV" in done.stdout, page
 
 

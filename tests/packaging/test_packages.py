@@ -10,22 +10,34 @@ from shipped import CHECKOUT, EPOCH, PPC64LE, VERSION
 
 pytestmark = pytest.mark.packages
 
-PAGES = ["man5/orv-registry.5.gz", "man5/orvpatch-archive.5.gz", "man5/orvpatch.log.5.gz", "man5/patch.ini.5.gz",
-         "man5/patches.hist.5.gz", "man8/orvpatch.8.gz"]
+PAGES = [
+    "man5/orv-registry.5.gz",
+    "man5/orvpatch-archive.5.gz",
+    "man5/orvpatch.log.5.gz",
+    "man5/patch.ini.5.gz",
+    "man5/patches.hist.5.gz",
+    "man8/orvpatch.8.gz",
+]
 
 
 def everywhere(name):
     """The program, its man pages and completions, and what else of it every kind of package holds."""
-    return {f"sbin/{name}", f"share/bash-completion/completions/{name}",
-            f"share/fish/vendor_completions.d/{name}.fish", *OF_ONE[name]()}
+    return {
+        f"sbin/{name}",
+        f"share/bash-completion/completions/{name}",
+        f"share/fish/vendor_completions.d/{name}.fish",
+        *OF_ONE[name](),
+    }
 
 
 def of_orvpatch():
     """README and the like, and docs but for what only those who release need."""
     top = [name for name in ("README.md", "SECURITY.md") if (CHECKOUT / name).exists()]
     docs = [f"docs/{path.name}" for path in CHECKOUT.glob("docs/*.*") if path.name != "release.md"]
-    return {*(f"share/doc/orvpatch/{name}" for name in [*top, *docs, "examples/orvpatch.logrotate"]),
-            *(f"share/man/{page}" for page in PAGES)}
+    return {
+        *(f"share/doc/orvpatch/{name}" for name in [*top, *docs, "examples/orvpatch.logrotate"]),
+        *(f"share/man/{page}" for page in PAGES),
+    }
 
 
 def of_orvpatchctl():
@@ -44,8 +56,13 @@ def site(name):
 
 
 def debian(name):
-    return {f"share/zsh/vendor-completions/_{name}", f"share/doc/{name}/changelog.gz",
-            f"share/doc/{name}/changelog.Debian.gz", f"share/doc/{name}/copyright", f"share/lintian/overrides/{name}"}
+    return {
+        f"share/zsh/vendor-completions/_{name}",
+        f"share/doc/{name}/changelog.gz",
+        f"share/doc/{name}/changelog.Debian.gz",
+        f"share/doc/{name}/copyright",
+        f"share/lintian/overrides/{name}",
+    }
 
 
 def output_of(*command):
@@ -113,14 +130,24 @@ def test_tarball_holds_exactly_what_is_shipped(build, tar_members, name):
 
 @for_power
 def test_rpm_holds_exactly_what_is_shipped(rpm, name):
-    rows = output_of("rpm", "-qp", "--qf", "[%{FILEMODES:perms} %{FILEUSERNAME} %{FILEGROUPNAME} %{FILEMTIMES} "
-                     "%{FILENAMES}\n]", rpm).decode().splitlines()
+    rows = (
+        output_of(
+            "rpm",
+            "-qp",
+            "--qf",
+            "[%{FILEMODES:perms} %{FILEUSERNAME} %{FILEGROUPNAME} %{FILEMTIMES} " "%{FILENAMES}\n]",
+            rpm,
+        )
+        .decode()
+        .splitlines()
+    )
     entries = [row.split(" ", 4) for row in rows]
     files = {path for mode, *_, path in entries if not mode.startswith("d")}
     assert files == {f"/usr/{path}" for path in everywhere(name) | site(name)}
     folders = {"orvpatch": ["", "/docs", "/examples"], "orvpatchctl": ["", "/notices", "/schema"]}[name]
     assert {path for mode, *_, path in entries if mode.startswith("d")} == {
-        f"/usr/share/doc/{name}{folder}" for folder in folders}
+        f"/usr/share/doc/{name}{folder}" for folder in folders
+    }
     assert {(user, group, time) for _, user, group, time, _ in entries} == {("root", "root", str(EPOCH))}
     for mode, *_, path in entries:
         executable = mode.startswith("d") or path == f"/usr/sbin/{name}"
@@ -133,7 +160,10 @@ def test_deb_control(build, name):
     fields = dict(re.findall(r"^([\w-]+): (.*)$", printed, re.M))
     more = {"orvpatch": "", "orvpatchctl": f" libarchive13 (>= 3.3.3), orvpatch (= {VERSION}-1),"}[name]
     assert (fields["Package"], fields["Architecture"], fields["Version"]) == (
-        name, build.architecture.deb, f"{VERSION}-1")
+        name,
+        build.architecture.deb,
+        f"{VERSION}-1",
+    )
     assert fields["Depends"] == f"libc6 (>= {build.architecture.levels[name]}),{more} procps"
     assert fields.get("Recommends") == {"orvpatch": None, "orvpatchctl": "gpgv"}[name]
 
@@ -160,14 +190,19 @@ def test_rpm_goes_below_usr_only(rpm):
 
 
 def test_lintian_is_silent(build, name):
-    done = subprocess.run(["lintian", "--allow-root", "-I", "--pedantic", build.package(".deb", name)],
-                          capture_output=True, text=True, check=False)
+    done = subprocess.run(
+        ["lintian", "--allow-root", "-I", "--pedantic", build.package(".deb", name)],
+        capture_output=True,
+        text=True,
+        check=False,
+    )
     assert (done.returncode, done.stdout) == (0, "")
 
 
 @for_power
 def test_rpmlint_is_silent(rpm):
-    done = subprocess.run(["rpmlint", "-c", CHECKOUT / "packaging/rpmlint.toml", rpm], capture_output=True,
-                          text=True, check=False)
+    done = subprocess.run(
+        ["rpmlint", "-c", CHECKOUT / "packaging/rpmlint.toml", rpm], capture_output=True, text=True, check=False
+    )
     assert re.search(r"1 packages and 0 specfiles checked; 0 errors, 0 warnings", done.stdout), done.stdout
     assert done.returncode == 0

@@ -13,21 +13,28 @@ pytestmark = pytest.mark.packages
 @pytest.fixture
 def elf(build, name):
     """readelf's view of a program: header, program headers, dynamic section, dynamic symbols."""
-    done = subprocess.run(["readelf", "-W", "-h", "-l", "-d", "--dyn-syms", build.folder / name], check=True,
-                          capture_output=True, text=True)
+    done = subprocess.run(
+        ["readelf", "-W", "-h", "-l", "-d", "--dyn-syms", build.folder / name],
+        check=True,
+        capture_output=True,
+        text=True,
+    )
     return done.stdout
 
 
 # What may be called: functions that libarchive 3.3.3 has. Most are older than 3.1; read_support_filter_zstd came with
 # 3.3.3 itself. A new call is entered here when the release notes of libarchive say that it is no younger.
-LIBARCHIVE_3_3_3 = {f"archive_{name}" for name in """
+LIBARCHIVE_3_3_3 = {
+    f"archive_{name}"
+    for name in """
     entry_copy_pathname entry_copy_symlink entry_filetype entry_free entry_gid entry_hardlink entry_mtime entry_new
     entry_pathname entry_perm entry_set_mode entry_set_mtime entry_set_size entry_size entry_symlink entry_uid
     errno error_string filter_bytes read_data read_free read_header_position read_new read_next_header
     read_open_filename read_support_filter_bzip2 read_support_filter_compress read_support_filter_gzip
     read_support_filter_lzip read_support_filter_lzma read_support_filter_xz read_support_filter_zstd
     read_support_format_empty read_support_format_tar write_close write_data write_free write_header write_new
-    write_open_filename write_set_format_gnutar""".split()}
+    write_open_filename write_set_format_gnutar""".split()
+}
 
 
 def undefined_symbols(elf):
@@ -64,14 +71,16 @@ def test_c_library_level(elf, build, name):
 
 @pytest.mark.parametrize("page", ["README.md", "man/orvpatch.8"])
 def test_pages_tell_the_c_library_level(page):
-    told = re.findall(r"glibc ([\d.]+) or later on POWER, ([\d.]+) or later on x86-64",
-                      " ".join((CHECKOUT / page).read_text().split()))
+    told = re.findall(
+        r"glibc ([\d.]+) or later on POWER, ([\d.]+) or later on x86-64",
+        " ".join((CHECKOUT / page).read_text().split()),
+    )
     assert told == [(PPC64LE.levels["orvpatch"], AMD64.levels["orvpatch"])]
 
 
 def test_readme_tells_what_orvpatchctl_needs():
     text = " ".join((CHECKOUT / "README.md").read_text().split())
-    level, = {architecture.levels["orvpatchctl"] for architecture in (AMD64, PPC64LE)}
+    (level,) = {architecture.levels["orvpatchctl"] for architecture in (AMD64, PPC64LE)}
     assert f"`orvpatchctl` needs glibc {level} or later and libarchive 3.3.3 or later" in text
 
 

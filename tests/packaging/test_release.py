@@ -31,8 +31,18 @@ def clone(tmp_path):
         shutil.copy(CHECKOUT / name, folder / name)
     git("-C", str(folder), "init", "--quiet")
     git("-C", str(folder), "add", "--all")
-    git("-C", str(folder), "-c", "user.name=sources", "-c", "user.email=sources@norvik.example",
-        "commit", "--quiet", "-m", "sources")
+    git(
+        "-C",
+        str(folder),
+        "-c",
+        "user.name=sources",
+        "-c",
+        "user.email=sources@norvik.example",
+        "commit",
+        "--quiet",
+        "-m",
+        "sources",
+    )
     return folder
 
 
@@ -40,10 +50,20 @@ def release(clone):
     """The user's configuration and the mask must not matter."""
     configuration = clone.parent / "gitconfig"
     configuration.write_text("[tar]\n\tumask = 0077\n")
-    return subprocess.run([clone / "scripts/release"], stdin=subprocess.DEVNULL, capture_output=True, text=True,
-                          check=False, umask=0o027,
-                          env={**os.environ, "GIT_CONFIG_GLOBAL": str(configuration), "CXXFLAGS": "-O0",
-                               "ORVPATCH_SYSROOTS": str(SYSROOTS)})
+    return subprocess.run(
+        [clone / "scripts/release"],
+        stdin=subprocess.DEVNULL,
+        capture_output=True,
+        text=True,
+        check=False,
+        umask=0o027,
+        env={
+            **os.environ,
+            "GIT_CONFIG_GLOBAL": str(configuration),
+            "CXXFLAGS": "-O0",
+            "ORVPATCH_SYSROOTS": str(SYSROOTS),
+        },
+    )
 
 
 def test_all_artefacts_and_their_checksums(clone):
@@ -98,23 +118,31 @@ def check_spdx(document, sums, artefacts):
     for name, package in files.items():
         assert f"{package['checksums'][0]['checksumValue']}  {name}\n" in sums
 
-    related = [(row["spdxElementId"], row["relationshipType"], row["relatedSpdxElement"])
-               for row in document["relationships"]]
+    related = [
+        (row["spdxElementId"], row["relationshipType"], row["relatedSpdxElement"]) for row in document["relationships"]
+    ]
     ends = {end for one, _, other in related for end in (one, other)}
     assert ends == {"SPDXRef-DOCUMENT", *packages}
     for name, package in files.items():
-        tools = {packages[one]["name"] for one, kind, other in related
-                 if other == package["SPDXID"] and kind == "BUILD_TOOL_OF"}
+        tools = {
+            packages[one]["name"]
+            for one, kind, other in related
+            if other == package["SPDXID"] and kind == "BUILD_TOOL_OF"
+        }
         if name.startswith("orv-patch-"):
             assert tools == {"ansible-core", "gzip", "tar"}, name
         elif name.endswith((".deb", ".rpm")):
             assert {"cmake", "g++-12", "ninja-build"} <= tools and "ansible-core" not in tools, name
-        linked = {packages[other]["name"] for one, kind, other in related
-                  if one == package["SPDXID"] and kind.endswith("_LINK")}
+        linked = {
+            packages[other]["name"]
+            for one, kind, other in related
+            if one == package["SPDXID"] and kind.endswith("_LINK")
+        }
         if name.endswith((".deb", ".rpm")):
             kind = "amd64" if "amd64" in name else "ppc64el"
-            libraries = {f"{library}-{kind}-cross"
-                         for library in ("libc6", "libc6-dev", "libgcc-10-dev", "libstdc++-10-dev")}
+            libraries = {
+                f"{library}-{kind}-cross" for library in ("libc6", "libc6-dev", "libgcc-10-dev", "libstdc++-10-dev")
+            }
             if name.startswith("orvpatchctl"):
                 libraries |= {"libarchive13", "libcli11-dev", "nlohmann-json3-dev"}
             assert linked == libraries, name
@@ -122,8 +150,12 @@ def check_spdx(document, sums, artefacts):
 
 def check_versions(text, version):
     assert text.startswith(f"orvpatch {version}\n")
-    compiler = subprocess.run(["dpkg-query", "-W", "-f", "${Version}", "g++-12-powerpc64le-linux-gnu"], check=True,
-                              capture_output=True, text=True).stdout
+    compiler = subprocess.run(
+        ["dpkg-query", "-W", "-f", "${Version}", "g++-12-powerpc64le-linux-gnu"],
+        check=True,
+        capture_output=True,
+        text=True,
+    ).stdout
     assert f"  g++-12-powerpc64le-linux-gnu {compiler}\n" in text
     for line in (CHECKOUT / "packaging/sysroot.packages").read_text().splitlines():
         if line.startswith(("x86_64 ", "ppc64le ")):
@@ -145,8 +177,15 @@ def test_a_tag_of_another_version_is_refused(clone):
 
 def linted(sources):
     """In every language of the tree, outside of a repository."""
-    return subprocess.run(["scripts/lint"], cwd=sources, stdin=subprocess.DEVNULL, capture_output=True, text=True,
-                          check=False, env={**os.environ, "GIT_CEILING_DIRECTORIES": str(sources.parent)})
+    return subprocess.run(
+        ["scripts/lint"],
+        cwd=sources,
+        stdin=subprocess.DEVNULL,
+        capture_output=True,
+        text=True,
+        check=False,
+        env={**os.environ, "GIT_CEILING_DIRECTORIES": str(sources.parent)},
+    )
 
 
 def version_of(clone):
@@ -168,7 +207,10 @@ def test_a_checkout_with_changes_is_refused(clone):
     done = release(clone)
     assert done.returncode == 1
     assert done.stderr.splitlines() == [
-        "release: the checkout has changes; commit them first", " M CHANGELOG.md", "?? src/new.cpp"]
+        "release: the checkout has changes; commit them first",
+        " M CHANGELOG.md",
+        "?? src/new.cpp",
+    ]
     assert not (clone / "dist").exists()
 
 

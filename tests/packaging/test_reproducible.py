@@ -38,5 +38,5 @@ def test_header_of_the_log_has_the_date_of_the_release(build, home):
     """1795219200 is 2026-11-21 00:00:00 UTC."""
     words = [*build.architecture.runner, build.program, "-h", home.path, "-vi", "none"]
     subprocess.run(words, stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL, check=False)
-    header, = home.log().headers
+    (header,) = home.log().headers
     assert (header.date, header.time) == ("11/21/26", "00:00:00")

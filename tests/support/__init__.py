@@ -9,6 +9,19 @@ from .scratch import remove_tree, scratch_folder
 from .snapshot import Entry
 
 __all__ = [
-    "Account", "Call", "Entry", "HistoryLine", "Log", "LogLine", "Patch", "ProductHome", "Program", "Result",
-    "parse_log", "remove_tree", "scratch_folder", "second_account", "stubs",
+    "Account",
+    "Call",
+    "Entry",
+    "HistoryLine",
+    "Log",
+    "LogLine",
+    "Patch",
+    "ProductHome",
+    "Program",
+    "Result",
+    "parse_log",
+    "remove_tree",
+    "scratch_folder",
+    "second_account",
+    "stubs",
 ]

@@ -29,8 +29,21 @@ def second_account(folder):
     if _knows(private):
         yield private
         return
-    subprocess.run(["useradd", "--no-create-home", "--no-user-group", "--home-dir", "/", "--shell", "/bin/sh",
-                    "--uid", str(_UID), _NAME], check=True)
+    subprocess.run(
+        [
+            "useradd",
+            "--no-create-home",
+            "--no-user-group",
+            "--home-dir",
+            "/",
+            "--shell",
+            "/bin/sh",
+            "--uid",
+            str(_UID),
+            _NAME,
+        ],
+        check=True,
+    )
     try:
         yield Account(_NAME, _UID, ())
     finally:

@@ -18,9 +18,26 @@ class Patch:
     makes a valid patch of level 06.10.01.00 for a component that `ProductHome.component` made by default.
     """
 
-    def __init__(self, product="ox", *, level="06100100", platform="lpp266", target="vema", fixpack="fp0001",
-                 code=None, name=None, title=None, arch="lpp266", exe=None, prereqs=None, dependents=(),
-                 pre_patch=(), pre=(), post=(), descriptor=None):
+    def __init__(
+        self,
+        product="ox",
+        *,
+        level="06100100",
+        platform="lpp266",
+        target="vema",
+        fixpack="fp0001",
+        code=None,
+        name=None,
+        title=None,
+        arch="lpp266",
+        exe=None,
+        prereqs=None,
+        dependents=(),
+        pre_patch=(),
+        pre=(),
+        post=(),
+        descriptor=None,
+    ):
         self.product = "k" + product if len(product) == 2 else product
         self.platform, self.target, self.fixpack = platform, target, fixpack
         self.level = level
@@ -89,8 +106,9 @@ class Patch:
         with tempfile.TemporaryDirectory(prefix="orvpatch-archive-") as folder:
             self._fill(Path(folder))
             members = ["."] if dotted else sorted(os.listdir(folder)) or ["--files-from=/dev/null"]
-            subprocess.run(["tar", "--owner=0", "--group=0", "-cf", target.absolute(), "-C", folder, *members],
-                           check=True)
+            subprocess.run(
+                ["tar", "--owner=0", "--group=0", "-cf", target.absolute(), "-C", folder, *members], check=True
+            )
         return target
 
     def _add(self, path, make):
@@ -106,8 +124,12 @@ class Patch:
 
     def _product_info(self):
         fields = {"productCode": self.code, "patchName": self.name, "patchDescriptiveName": self.title}
-        fields.update(zip(("productVer", "productRel", "productMod", "productLvl"),
-                          (self.level[at:at + 2] for at in (0, 2, 4, 6))))
+        fields.update(
+            zip(
+                ("productVer", "productRel", "productMod", "productLvl"),
+                (self.level[at : at + 2] for at in (0, 2, 4, 6)),
+            )
+        )
         fields.update(productBinArch=self.arch, productEXE=self.exe)
         return [f"{key} = {value}" for key, value in fields.items() if value is not None]
 

@@ -6,8 +6,18 @@ import os
 import subprocess
 import time
 
-_FLAGS = ("--headless", "--no-sandbox", "--disable-gpu", "--disable-quic", "--no-first-run", "--disable-extensions",
-          "--disable-background-networking", "--disable-component-update", "--disable-sync", "--disable-dev-shm-usage")
+_FLAGS = (
+    "--headless",
+    "--no-sandbox",
+    "--disable-gpu",
+    "--disable-quic",
+    "--no-first-run",
+    "--disable-extensions",
+    "--disable-background-networking",
+    "--disable-component-update",
+    "--disable-sync",
+    "--disable-dev-shm-usage",
+)
 
 
 class Browser:
@@ -18,10 +28,21 @@ class Browser:
         self._number, self._buffer = 0, b""
         here, there = os.pipe(), os.pipe()
         self._process = subprocess.Popen(
-            ["bash", "-c", f'exec 3<&{here[0]} 4>&{there[1]}; exec chromium "$@"', "bash", *_FLAGS,
-             "--remote-debugging-pipe", f"--user-data-dir={profile}", "about:blank"],
-            pass_fds=(here[0], there[1]), stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
-            stderr=subprocess.DEVNULL)
+            [
+                "bash",
+                "-c",
+                f'exec 3<&{here[0]} 4>&{there[1]}; exec chromium "$@"',
+                "bash",
+                *_FLAGS,
+                "--remote-debugging-pipe",
+                f"--user-data-dir={profile}",
+                "about:blank",
+            ],
+            pass_fds=(here[0], there[1]),
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.DEVNULL,
+            stderr=subprocess.DEVNULL,
+        )
         os.close(here[0])
         os.close(there[1])
         self._to, self._from = here[1], there[0]
@@ -41,10 +62,10 @@ class Browser:
 
     def show(self, path, width=1200, scheme="light", media=""):
         """Loads a file and waits until it stands."""
-        self.ask("Emulation.setDeviceMetricsOverride", width=width, height=900, deviceScaleFactor=1,
-                 mobile=width < 600)
-        self.ask("Emulation.setEmulatedMedia", media=media,
-                 features=[{"name": "prefers-color-scheme", "value": scheme}])
+        self.ask("Emulation.setDeviceMetricsOverride", width=width, height=900, deviceScaleFactor=1, mobile=width < 600)
+        self.ask(
+            "Emulation.setEmulatedMedia", media=media, features=[{"name": "prefers-color-scheme", "value": scheme}]
+        )
         self.ask("Page.navigate", url=path.as_uri())
         limit = time.monotonic() + 60
         while self.run("location.protocol + document.readyState") != "file:complete":
@@ -63,9 +84,11 @@ class Browser:
 
     def brightness(self):
         """How bright the text and the background of the page are, each from 0 to 765."""
-        return self.run("""(() => { const style = getComputedStyle(document.body);
+        return self.run(
+            """(() => { const style = getComputedStyle(document.body);
             return [style.color, style.backgroundColor].map(c => c.match(/\\d+/g).map(Number)
-                .slice(0, 3).reduce((a, b) => a + b)); })()""")
+                .slice(0, 3).reduce((a, b) => a + b)); })()"""
+        )
 
     def picture(self, path):
         """Writes the whole page as a PNG file."""
@@ -89,8 +112,12 @@ class Browser:
         method, details = event.get("method"), event.get("params", {})
         if method == "Network.requestWillBeSent":
             self.requests.append(details["request"]["url"])
-        elif method in ("Runtime.consoleAPICalled", "Runtime.exceptionThrown", "Log.entryAdded",
-                        "Page.javascriptDialogOpening"):
+        elif method in (
+            "Runtime.consoleAPICalled",
+            "Runtime.exceptionThrown",
+            "Log.entryAdded",
+            "Page.javascriptDialogOpening",
+        ):
             self.complaints.append(details)
 
     def _read(self):

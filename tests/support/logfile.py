@@ -70,10 +70,8 @@ def parse_log(text):
         text = text.decode("utf-8", "surrogateescape")
     starts = list(_HEADER.finditer(text))
     ends = [match.start() for match in starts[1:]] + [len(text)]
-    runs = [
-        Run(_header(match), _lines(text[match.end():end])) for match, end in zip(starts, ends)
-    ]
-    return Log(runs, text[:starts[0].start()] if starts else text)
+    runs = [Run(_header(match), _lines(text[match.end() : end])) for match, end in zip(starts, ends)]
+    return Log(runs, text[: starts[0].start()] if starts else text)
 
 
 def _header(match):
@@ -87,7 +85,7 @@ def _lines(text):
         prefix = _PREFIX.match(row)
         if prefix:
             level, _, component, number = prefix.groups()
-            lines.append(LogLine(level.strip(), component, int(number), row[prefix.end():]))
+            lines.append(LogLine(level.strip(), component, int(number), row[prefix.end() :]))
         elif lines:
             lines[-1] = lines[-1]._replace(message=lines[-1].message + "\n" + row)
     return lines

@@ -28,9 +28,9 @@ class Call(NamedTuple):
     args: tuple
     user: str
     cwd: str
-    path: str       # PATH
+    path: str  # PATH
     quillhome: str  # QUILLHOME, empty when it was not set
-    seen: dict      # watched file -> its content at the moment of the call; absent when it was not there
+    seen: dict  # watched file -> its content at the moment of the call; absent when it was not there
 
     def __str__(self):
         return " ".join([self.program, *(argument or "''" for argument in self.args)])
@@ -191,8 +191,11 @@ class ProductHome:
         """The well-formed rows of the run information as Instance tuples in file order, live or not."""
         separator = self._separator()
         fields = [row.split(separator) for row in self.run_info.split("\n")[1:]] if separator else []
-        return [Instance(row[1], "" if row[3] == "None" else row[3], int(row[2]))
-                for row in fields if len(row) >= 5 and row[2].isdecimal()]
+        return [
+            Instance(row[1], "" if row[3] == "None" else row[3], int(row[2]))
+            for row in fields
+            if len(row) >= 5 and row[2].isdecimal()
+        ]
 
     def instances(self):
         """(code, instance) of all rows whose process lives, sorted; the default instance is ""."""
@@ -236,8 +239,9 @@ class ProductHome:
         if not self.exists("patchlogs/patches.hist"):
             return []
         lines = os.fsdecode(self.read("patchlogs/patches.hist")).split("\n")[:-1]
-        return [HistoryLine(*(field.strip() for field in line.split(" | ")))
-                for line in lines if not line.startswith("#")]
+        return [
+            HistoryLine(*(field.strip() for field in line.split(" | "))) for line in lines if not line.startswith("#")
+        ]
 
     # --- the end ---------------------------------------------------------------------------------------
 
@@ -288,8 +292,15 @@ class ProductHome:
 
     def _operate(self, words, user=None):
         environment = {**os.environ, "QUILL_UNJOURNALED": "1"}
-        done = subprocess.run(words, env=environment, cwd="/", check=True, stdin=subprocess.DEVNULL,
-                              stdout=subprocess.PIPE, **identity(user))
+        done = subprocess.run(
+            words,
+            env=environment,
+            cwd="/",
+            check=True,
+            stdin=subprocess.DEVNULL,
+            stdout=subprocess.PIPE,
+            **identity(user),
+        )
         return done.stdout
 
     def _call(self, number, line):
@@ -305,7 +316,9 @@ class ProductHome:
             words = os.fsdecode(Path(f"/proc/{pid}/cmdline").read_bytes()).split("\0")
         except OSError:
             return False
-        return any(os.path.realpath(word).startswith(os.path.realpath(self.path) + "/") for word in words if "/" in word)
+        return any(
+            os.path.realpath(word).startswith(os.path.realpath(self.path) + "/") for word in words if "/" in word
+        )
 
 
 def _is_alive(pid):

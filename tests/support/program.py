@@ -53,8 +53,9 @@ class Program:
             self._copy = shutil.copy(self.binary, folder)
         return [*self.runner, self._copy]
 
-    def run(self, *arguments, env=None, cwd=None, user=None, close=(), stdin=subprocess.DEVNULL, timeout=120,
-            wrapper=()):
+    def run(
+        self, *arguments, env=None, cwd=None, user=None, close=(), stdin=subprocess.DEVNULL, timeout=120, wrapper=()
+    ):
         """Runs it with these arguments and waits for the end.
 
         env      variables to set, or to remove where the value is None
@@ -63,9 +64,16 @@ class Program:
         wrapper  command words put in front of everything, such as ["strace", "-f"]
         """
         process = subprocess.Popen(
-            [*wrapper, *self.argv_for(user), *map(os.fsdecode, arguments)], stdin=stdin, stdout=subprocess.PIPE,
-            stderr=subprocess.PIPE, cwd=cwd, env=_environment(env), start_new_session=True,
-            preexec_fn=(lambda: [os.close(fd) for fd in close]) if close else None, **identity(user))
+            [*wrapper, *self.argv_for(user), *map(os.fsdecode, arguments)],
+            stdin=stdin,
+            stdout=subprocess.PIPE,
+            stderr=subprocess.PIPE,
+            cwd=cwd,
+            env=_environment(env),
+            start_new_session=True,
+            preexec_fn=(lambda: [os.close(fd) for fd in close]) if close else None,
+            **identity(user),
+        )
         try:
             out, err = process.communicate(timeout=timeout)
         except subprocess.TimeoutExpired:

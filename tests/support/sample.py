@@ -43,7 +43,8 @@ class Sample:
         """The running instances, in the program's words, with the process id at the end."""
         return [
             f"{f'{row.name} instance of ' if row.name else ''}{_COMPONENTS[row.code]}, pid {row.pid}"
-            for row in sorted(self.home.rows()) if (row.code, row.name) in self.home.instances()
+            for row in sorted(self.home.rows())
+            if (row.code, row.name) in self.home.instances()
         ]
 
     def levels(self):
@@ -73,7 +74,7 @@ class Sample:
 
 
 def _fix_pack(code, target, *, fixpack="fp0002", level="06100002", **fields):
-    dotted = ".".join(level[at:at + 2] for at in (0, 2, 4, 6))
+    dotted = ".".join(level[at : at + 2] for at in (0, 2, 4, 6))
     title = f"{_COMPONENTS[code]}, level {dotted}"
     patch = Patch(code, target=target, fixpack=fixpack, level=level, title=title, **fields)
     return patch.file(f"lpp266/{code}/bin/k{code}", f"level {dotted}\n", 0o755)

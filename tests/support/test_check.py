@@ -30,8 +30,9 @@ def chosen(scratch):
     def call(*words, **variables):
         kept = {name: value for name, value in os.environ.items() if not name.startswith("ORVPATCH_")}
         environment = {**kept, "PATH": path, **variables}
-        done = subprocess.run([scratch / "scripts/check", *words], env=environment, capture_output=True, text=True,
-                              check=False)
+        done = subprocess.run(
+            [scratch / "scripts/check", *words], env=environment, capture_output=True, text=True, check=False
+        )
         assert done.returncode == 0, done.stdout + done.stderr
         given = calls.read_text().splitlines()
         assert len({"-L", "-LE"} & set(given)) == 1

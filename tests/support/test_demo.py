@@ -18,8 +18,15 @@ def demo(program, scratch):
 
     def run(*options, commands=""):
         environment = {**os.environ, "TMPDIR": str(scratch), "SHELL": "/bin/sh"}
-        return subprocess.run([DEMO, *options, program.binary], input=commands, env=environment, text=True,
-                              capture_output=True, timeout=300, check=False)
+        return subprocess.run(
+            [DEMO, *options, program.binary],
+            input=commands,
+            env=environment,
+            text=True,
+            capture_output=True,
+            timeout=300,
+            check=False,
+        )
 
     return run
 
@@ -58,8 +65,14 @@ def test_a_step_that_does_not_go_as_announced_ends_the_demo(scratch):
     other.mkdir()
     (other / "orvpatch").write_text("#!/bin/sh\nexit 0\n")
     (other / "orvpatch").chmod(0o755)
-    done = subprocess.run([DEMO, other / "orvpatch"], env={**os.environ, "TMPDIR": str(scratch)}, text=True,
-                          capture_output=True, timeout=300, check=False)
+    done = subprocess.run(
+        [DEMO, other / "orvpatch"],
+        env={**os.environ, "TMPDIR": str(scratch)},
+        text=True,
+        capture_output=True,
+        timeout=300,
+        check=False,
+    )
     assert done.returncode == 1
     assert "NOT AS ANNOUNCED" in done.stderr
     assert [path.name for path in scratch.iterdir()] == ["bin"]

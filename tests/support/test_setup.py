@@ -20,13 +20,20 @@ class Machine:
         query = f"""shift 3
             for name; do grep -q -x -F -e "$name" {self.lacking} || printf 'ii  %s\\n' "$name"; done"""
         log = f'echo "$(basename "$0") $*" >>{self.calls}'
-        self.path = stubs(folder / "bin", **{
-            "dpkg-query": query, "apt-get": f"{log}\n{apt_get}".format(lacking=self.lacking),
-            "id": f"echo {user}", "sudo": f"{log}\n{sudo}"})
+        self.path = stubs(
+            folder / "bin",
+            **{
+                "dpkg-query": query,
+                "apt-get": f"{log}\n{apt_get}".format(lacking=self.lacking),
+                "id": f"echo {user}",
+                "sudo": f"{log}\n{sudo}",
+            },
+        )
 
     def setup(self, *groups):
-        return subprocess.run([_SETUP, *groups], env={"PATH": self.path}, capture_output=True, text=True,
-                              timeout=60, check=False)
+        return subprocess.run(
+            [_SETUP, *groups], env={"PATH": self.path}, capture_output=True, text=True, timeout=60, check=False
+        )
 
 
 _INSTALLS = 'case "$*" in *install*) : >{lacking} ;; esac'
@@ -49,7 +56,9 @@ def test_only_what_is_missing_is_installed_after_an_update(scratch):
     machine.lacking.write_text("ninja-build\ncmake\n")
     assert outcome(machine.setup("build")) == (0, "", "setup: installing cmake ninja-build\n")
     assert machine.calls.read_text().splitlines() == [
-        f"apt-get {_APT} update", f"apt-get {_APT} install -y --no-install-recommends cmake ninja-build"]
+        f"apt-get {_APT} update",
+        f"apt-get {_APT} install -y --no-install-recommends cmake ninja-build",
+    ]
 
 
 def test_a_group_that_was_not_asked_for_is_left_alone(scratch):
@@ -64,7 +73,8 @@ def test_an_ordinary_user_installs_through_sudo(scratch):
     machine.lacking.write_text("cmake\n")
     assert machine.setup("build").returncode == 0
     assert machine.calls.read_text().splitlines()[0] == (
-        f"sudo env DEBIAN_FRONTEND=noninteractive LC_ALL=C apt-get {_APT} update")
+        f"sudo env DEBIAN_FRONTEND=noninteractive LC_ALL=C apt-get {_APT} update"
+    )
 
 
 @pytest.mark.parametrize("user, cause", [(0, "E: no network"), (1000, "sudo: not allowed")])
@@ -72,8 +82,10 @@ def test_what_cannot_be_installed_is_named(scratch, user, cause):
     machine = Machine(scratch, _FAILS, user=user, sudo="echo 'sudo: not allowed' >&2; exit 1")
     machine.lacking.write_text("rsync\n")
     assert outcome(machine.setup("bench")) == (
-        1, "", f"setup: installing rsync\n{cause}\n"
-        "setup: these packages are missing and cannot be installed here: rsync\n")
+        1,
+        "",
+        f"setup: installing rsync\n{cause}\n" "setup: these packages are missing and cannot be installed here: rsync\n",
+    )
 
 
 def test_an_unknown_group_is_refused(scratch):

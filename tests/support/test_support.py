@@ -16,8 +16,9 @@ def alive(pid):
 
 
 def agent(home, *words):
-    return subprocess.run([f"{home.path}/bin/QuillAgent", *words], stdin=subprocess.DEVNULL, capture_output=True,
-                          timeout=30, check=False)
+    return subprocess.run(
+        [f"{home.path}/bin/QuillAgent", *words], stdin=subprocess.DEVNULL, capture_output=True, timeout=30, check=False
+    )
 
 
 def test_start_makes_a_live_process_and_a_row(home):
@@ -25,7 +26,9 @@ def test_start_makes_a_live_process_and_a_row(home):
     pid = home.pid("ox")
     assert alive(pid)
     assert home.run_info.splitlines() == [
-        "FIELDSEP=|", f"{os.uname().nodename}|ox|{pid}|None|{pwd.getpwuid(os.geteuid()).pw_name}"]
+        "FIELDSEP=|",
+        f"{os.uname().nodename}|ox|{pid}|None|{pwd.getpwuid(os.geteuid()).pw_name}",
+    ]
     assert home.instances() == [("ox", "")]
 
 
@@ -48,13 +51,26 @@ def test_each_start_form_of_the_scripts_is_understood(home):
     assert server.returncode == 0
     assert home.instances() == [("ox", ""), ("qa", ""), ("wn", "north"), ("yn", "abc")]
     assert home.calls() == [
-        "QuillAgent start ox", "QuillAgent -o abc start yn", "QuillAgent -p north start wn",
-        "QuillServer start ''"]
+        "QuillAgent start ox",
+        "QuillAgent -o abc start yn",
+        "QuillAgent -p north start wn",
+        "QuillServer start ''",
+    ]
 
 
-@pytest.mark.parametrize("words", [
-    (), ("start",), ("restart", "ox"), ("-o", "north", "start", "wn"), ("-p", "abc", "start", "yn"),
-    ("-o", "", "start", "yn"), ("-x", "abc", "start", "yn"), ("start", "ox", "")])
+@pytest.mark.parametrize(
+    "words",
+    [
+        (),
+        ("start",),
+        ("restart", "ox"),
+        ("-o", "north", "start", "wn"),
+        ("-p", "abc", "start", "yn"),
+        ("-o", "", "start", "yn"),
+        ("-x", "abc", "start", "yn"),
+        ("start", "ox", ""),
+    ],
+)
 def test_any_other_form_is_refused(home, words):
     assert agent(home, *words).returncode == 64
     assert home.rows() == []
@@ -178,45 +194,70 @@ def test_an_archive_names_its_members_without_a_leading_dot(patch_dir):
     patch = Patch("ox").file("bin/a", "x").script("go.sh", when="post")
     archive = patch.write(patch_dir)
     assert archive.name == "kox_lpp266_vema_fp0001.tar"
-    assert members(archive) == [
-        "go.sh", "patch.ini", "updated_files/", "updated_files/bin/", "updated_files/bin/a"]
+    assert members(archive) == ["go.sh", "patch.ini", "updated_files/", "updated_files/bin/", "updated_files/bin/a"]
     assert "./patch.ini" in members(patch.write(patch_dir, "dotted.tar", dotted=True))
 
 
 def test_the_descriptor_holds_what_was_asked_for():
-    patch = Patch("ox", level="06200305", name="N", title="T", exe="k.exe", prereqs={"gl": "06.10.00.00"},
-                  dependents=["all"], pre_patch=["a"], pre=["b"], post=["c"])
+    patch = Patch(
+        "ox",
+        level="06200305",
+        name="N",
+        title="T",
+        exe="k.exe",
+        prereqs={"gl": "06.10.00.00"},
+        dependents=["all"],
+        pre_patch=["a"],
+        pre=["b"],
+        post=["c"],
+    )
     assert patch.descriptor_text() == (
         "[ProductInfo]\nproductCode = kox\npatchName = N\npatchDescriptiveName = T\n"
         "productVer = 06\nproductRel = 20\nproductMod = 03\nproductLvl = 05\n"
         "productBinArch = lpp266\nproductEXE = k.exe\n\n"
         "[PreReqs]\ngl = 06.10.00.00\n\n[Dependents]\nall\n\n"
-        "[PrePatchCommands]\na\n\n[PreCommands]\nb\n\n[PostCommands]\nc\n")
+        "[PrePatchCommands]\na\n\n[PreCommands]\nb\n\n[PostCommands]\nc\n"
+    )
 
 
 def test_a_patch_script_journals_its_call(home, patch_dir):
     archive = Patch("ox").script("go.sh", status=5, out="o'", err="e\n", body="echo body").write(patch_dir)
     subprocess.run(["tar", "-xf", archive], cwd=patch_dir, check=True)
-    done = subprocess.run([patch_dir / "go.sh", "x"], cwd="/", capture_output=True, check=False,
-                          env={"QUILLHOME": home.prefix, "PATH": os.environ["PATH"]})
+    done = subprocess.run(
+        [patch_dir / "go.sh", "x"],
+        cwd="/",
+        capture_output=True,
+        check=False,
+        env={"QUILLHOME": home.prefix, "PATH": os.environ["PATH"]},
+    )
     assert (done.returncode, done.stdout, done.stderr) == (5, b"body\no'", b"e\n")
-    call, = home.journal()
+    (call,) = home.journal()
     assert (call.program, call.args, call.cwd, call.path, call.quillhome) == (
-        "go.sh", ("x",), "/", os.environ["PATH"], home.prefix)
+        "go.sh",
+        ("x",),
+        "/",
+        os.environ["PATH"],
+        home.prefix,
+    )
 
 
 RULE = "=" * 78
-HEADER = (f"{RULE}\n ORV Patch Log File\n   System Name: vm\n   User Name:   root\n   Process ID:  12\n"
-          f"   Build Date:  3/5/07 21:48:44\n{RULE}\n")
+HEADER = (
+    f"{RULE}\n ORV Patch Log File\n   System Name: vm\n   User Name:   root\n   Process ID:  12\n"
+    f"   Build Date:  3/5/07 21:48:44\n{RULE}\n"
+)
 
 
 def test_the_log_parser_joins_lines_of_one_message():
-    log = parse_log(HEADER + "TRACE 01:02:03 (main,7): main entry\nERROR 01:02:04 (file.cpp,8): a\n\nb\n"
-                    + HEADER + "INFO  01:02:05 (main,9): \n")
+    log = parse_log(
+        HEADER
+        + "TRACE 01:02:03 (main,7): main entry\nERROR 01:02:04 (file.cpp,8): a\n\nb\n"
+        + HEADER
+        + "INFO  01:02:05 (main,9): \n"
+    )
     assert [header.pid for header in log.headers] == [12, 12]
     assert log.headers[0] == ("vm", "root", 12, "3/5/07", "21:48:44")
-    assert log.entries() == [
-        ("TRACE", "main", "main entry"), ("ERROR", "file.cpp", "a\n\nb"), ("INFO", "main", "")]
+    assert log.entries() == [("TRACE", "main", "main entry"), ("ERROR", "file.cpp", "a\n\nb"), ("INFO", "main", "")]
     assert [line.line for line in log.lines] == [7, 8, 9]
     assert log.messages(level="ERROR") == ["a\n\nb"]
     assert log.preamble == ""
@@ -261,8 +302,9 @@ def test_another_user_runs_a_program_that_it_could_not_reach(scratch):
 def test_another_account_owns_an_agent_and_can_be_switched_to(home, other_owner):
     home.start("ox", user=other_owner.uid)
     shell = Program("/bin/sh", runner=[])
-    shown = shell.run("-c", f"ps -o user= -p {home.pid('ox')}; su - {other_owner.name} -c 'id -un'",
-                      wrapper=other_owner.wrapper)
+    shown = shell.run(
+        "-c", f"ps -o user= -p {home.pid('ox')}; su - {other_owner.name} -c 'id -un'", wrapper=other_owner.wrapper
+    )
     assert shown == (0, f"{other_owner.name}\n{other_owner.name}\n".encode(), b"")
 
 

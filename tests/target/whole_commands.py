@@ -89,9 +89,7 @@ def no_descriptor(home, patches):
 
 @command(6)
 def descriptor_without_product(home, patches):
-    return act(
-        "-vi", home, patch(descriptor="[PreReqs]\nax = 061000\n").write_descriptor(patches / "patch.ini")
-    )
+    return act("-vi", home, patch(descriptor="[PreReqs]\nax = 061000\n").write_descriptor(patches / "patch.ini"))
 
 
 @command(7)
@@ -163,9 +161,7 @@ def console_runs(home, patches):
 def report_of_two_patches(home, patches):
     product(home, "prod", "")
     home.component("qa")
-    patch(dependents=["all"]).script("2.sh", "pre").script("10.sh", "pre").script("1.sh", "pre_patch").write(
-        patches
-    )
+    patch(dependents=["all"]).script("2.sh", "pre").script("10.sh", "pre").script("1.sh", "pre_patch").write(patches)
     Patch("qa", target="vems").file("bin/server").script("1.sh", "post").write(patches)
     return act("-t", home, patches)
 
@@ -330,11 +326,7 @@ def folder_cannot_be_made(home, patches):
 @command(28)
 def version_file_is_gone(home, patches):
     product(home)
-    return act(
-        "-i",
-        home,
-        patch().script("1.sh", "post", body='rm "$quill_home/registry/xelpp266.ver"').write(patches),
-    )
+    return act("-i", home, patch().script("1.sh", "post", body='rm "$quill_home/registry/xelpp266.ver"').write(patches))
 
 
 # --- the environment -----------------------------------------------------------------------------------------

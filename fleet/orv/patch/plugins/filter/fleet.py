@@ -118,13 +118,7 @@ def is_bad(made, undoing=False):
 def document(entries, patches, started, ended, rollout):
     """The document of all entries."""
     shown = [dict(made, **last_word(made, rollout)) for made in entries]
-    return {
-        "fleet": shown,
-        "patches": patches,
-        "started": started,
-        "ended": ended,
-        "rollout": bool(rollout),
-    }
+    return {"fleet": shown, "patches": patches, "started": started, "ended": ended, "rollout": bool(rollout)}
 
 
 def last_word(made, rollout):

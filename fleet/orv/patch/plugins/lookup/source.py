@@ -71,10 +71,7 @@ class LookupModule(LookupBase):
 
     def run(self, terms, variables=None, **kwargs):
         self.set_options(var_options=variables, direct=kwargs)
-        return [
-            source(os.path.abspath(os.path.expanduser(term)), self.get_option("require_sums"))
-            for term in terms
-        ]
+        return [source(os.path.abspath(os.path.expanduser(term)), self.get_option("require_sums")) for term in terms]
 
 
 def source(path, require_sums):

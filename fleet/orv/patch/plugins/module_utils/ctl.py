@@ -12,10 +12,7 @@ FINDINGS = 1
 
 def arguments():
     """The options that say where a home is and with what it is read."""
-    return {
-        "home": {"type": "path", "required": True},
-        "orvpatchctl": {"type": "path", "default": "orvpatchctl"},
-    }
+    return {"home": {"type": "path", "required": True}, "orvpatchctl": {"type": "path", "default": "orvpatchctl"}}
 
 
 def run_arguments():
@@ -62,9 +59,7 @@ class Ctl:
         line = [self.program, command] + list(words) + ["--json"]
         status, out, err = self._module.run_command(line, environ_update={"LC_ALL": "C"}, cwd="/")
         if status not in accepted:
-            raise CtlError(
-                said(err) or "%s %s ended with status %d" % (self.program, command, status), status
-            )
+            raise CtlError(said(err) or "%s %s ended with status %d" % (self.program, command, status), status)
         return document(out, err, status)
 
     def status(self):

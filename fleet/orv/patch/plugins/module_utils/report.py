@@ -21,11 +21,7 @@ VERDICTS = [
         "The home is not as the patches want it, could not be compared with them, or was not taken back whole.",
     ),
     ("refused", "bad", "Refused before anything was changed."),
-    (
-        "running",
-        "bad",
-        "The installation was still at work when the time was over; the next run finds its end.",
-    ),
+    ("running", "bad", "The installation was still at work when the time was over; the next run finds its end."),
     ("unreachable", "bad", "The host did not answer, or stopped answering."),
     ("undone", "warn", "Taken back: the home is as it was before."),
     ("untouched", "soft", "Its turn did not come; nothing was changed."),
@@ -65,9 +61,7 @@ _TIME = re.compile(r"(\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d)(\.\d{1,6})?\d*(Z|[+-]\d\d:
 def visible(text):
     """A text from outside with nothing in it that moves a cursor, turns the direction of writing or is no
     character at all: the bytes of such are written as \\xHH, as orvpatchctl writes them."""
-    return "".join(
-        _bytes_of(c) if unicodedata.category(c) in ("Cc", "Cf", "Cs", "Zl", "Zp") else c for c in str(text)
-    )
+    return "".join(_bytes_of(c) if unicodedata.category(c) in ("Cc", "Cf", "Cs", "Zl", "Zp") else c for c in str(text))
 
 
 def _bytes_of(character):
@@ -143,10 +137,7 @@ def levels_of(entry):
     installed = {str(part.get("code", "")): str(part.get("level", "")) for part in entry["components"]}
     before = entry["levelsBefore"] or installed
     after = entry["levelsAfter"] or installed or before
-    return [
-        (product, before.get(product, ""), after.get(product, ""))
-        for product in sorted(set(before) | set(after))
-    ]
+    return [(product, before.get(product, ""), after.get(product, "")) for product in sorted(set(before) | set(after))]
 
 
 def summary_of(document):

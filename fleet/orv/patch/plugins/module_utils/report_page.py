@@ -161,11 +161,7 @@ def _facts(document, summary):
 
 def _told(fleet):
     """The homes of which the reason and the record are told."""
-    return [
-        entry
-        for entry in fleet
-        if kind_of(entry) == "bad" or (entry["verdict"] == "undone" and entry["reason"])
-    ]
+    return [entry for entry in fleet if kind_of(entry) == "bad" or (entry["verdict"] == "undone" and entry["reason"])]
 
 
 def _attention(told):
@@ -232,11 +228,7 @@ def _status(installer):
 
 
 def _difference(one):
-    return "%s %s: %s" % (
-        _bad(one.get("kind", "")),
-        _code(one.get("path", "")),
-        _escaped(one.get("text", "")),
-    )
+    return "%s %s: %s" % (_bad(one.get("kind", "")), _code(one.get("path", "")), _escaped(one.get("text", "")))
 
 
 def _finding(one):
@@ -284,9 +276,7 @@ def _grid(fleet):
     hosts = counts_by_host(fleet)
     for name, number in counts_of(fleet).items():
         kind = KINDS.get(name, "bad")
-        parts.append(
-            '<h3><span class="%s">%s</span> %d</h3>\n<ul class="tiles">\n' % (kind, _escaped(name), number)
-        )
+        parts.append('<h3><span class="%s">%s</span> %d</h3>\n<ul class="tiles">\n' % (kind, _escaped(name), number))
         for entry in fleet:
             if entry["verdict"] == name:
                 home = " <small>%s</small>" % _escaped(entry["home"]) if hosts[entry["host"]] > 1 else ""

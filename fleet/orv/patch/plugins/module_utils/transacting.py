@@ -105,9 +105,7 @@ class Transacting:
 def levels_of(record):
     patches = record["patches"] if record else []
     return {
-        "transaction": record["id"]
-        if record and not record["dryRun"] and record["verdict"] != "refused"
-        else None,
+        "transaction": record["id"] if record and not record["dryRun"] and record["verdict"] != "refused" else None,
         "levels_before": dict((one["product"], one["levelBefore"]) for one in patches),
         "levels_after": dict((one["product"], one["levelAfter"]) for one in patches),
     }
@@ -129,9 +127,7 @@ def reason(record, err):
     """Why it did not end well: what the record and standard error have to say."""
     said = []
     if record:
-        said += [
-            "%(rule)s: %(where)s %(text)s" % one for one in record["findings"] if one["severity"] == "error"
-        ]
+        said += ["%(rule)s: %(where)s %(text)s" % one for one in record["findings"] if one["severity"] == "error"]
         said += ["%(path)s: %(text)s" % one for one in record["differences"]]
         if record["installer"]["status"]:
             said.append(installer_said(record["installer"]))

@@ -23,16 +23,13 @@ def in_place(shown, status, history):
     if not concerned:
         return False
     return all(
-        patch["level"] == installed[patch["product"]] and is_last_pass(patch, history["records"])
-        for patch in concerned
+        patch["level"] == installed[patch["product"]] and is_last_pass(patch, history["records"]) for patch in concerned
     )
 
 
 def is_last_pass(patch, records):
     attempts = [
-        record
-        for record in records
-        if record["product"] == patch["product"] and record["target"] == patch["target"]
+        record for record in records if record["product"] == patch["product"] and record["target"] == patch["target"]
     ]
     if not attempts:
         return False
@@ -133,10 +130,7 @@ def level_lines(record, key):
 
 def changed_files(record):
     """Paths of replaced files, and of new ones."""
-    return [
-        sorted(one["path"] for one in record["files"] if one["change"] == kind)
-        for kind in ("replaced", "new")
-    ]
+    return [sorted(one["path"] for one in record["files"] if one["change"] == kind) for kind in ("replaced", "new")]
 
 
 def stopped(record):

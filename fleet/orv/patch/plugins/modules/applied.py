@@ -188,9 +188,7 @@ class Applying:
             self._tell_bad_end(run)
         if self.module.check_mode:
             self._check()
-        return self.transacting.start(
-            job, ["apply", self.program.home, self.patch, "--yes"] + self._options()
-        )
+        return self.transacting.start(job, ["apply", self.program.home, self.patch, "--yes"] + self._options())
 
     def _demand_digests(self, present):
         wanted = self.module.params["digests"]
@@ -202,9 +200,7 @@ class Applying:
             if patches.sha256(patches.path_of(self.patch, name)) != wanted.get(name)
         )
         if differing:
-            self.transacting.fail(
-                "not what it should be: %s" % ", ".join(differing), "refused", resumed=False
-            )
+            self.transacting.fail("not what it should be: %s" % ", ".join(differing), "refused", resumed=False)
 
     def _unchanged(self, run, status, found):
         """Nothing is left to do. A run that was cut off has done it: that is a change of this playbook."""
@@ -218,9 +214,7 @@ class Applying:
         now = dict((code, levels[code]) for code in products if code in levels)
         more = {} if resumed else {"levels_before": now, "levels_after": now}
         changed = resumed and not self.module.check_mode
-        self.transacting.succeed(
-            changed, "applied" if changed else "unchanged", record, resumed=resumed, **more
-        )
+        self.transacting.succeed(changed, "applied" if changed else "unchanged", record, resumed=resumed, **more)
 
     def _record_of(self, found):
         """The record of the transaction that brought these patches, while it is kept."""
@@ -259,12 +253,7 @@ class Applying:
 
     def _check_options(self):
         named = (("keyring", "--keyring"), ("installer", "--installer"), ("search_path", "--path"))
-        return [
-            word
-            for key, option in named
-            if self.module.params[key]
-            for word in (option, self.module.params[key])
-        ]
+        return [word for key, option in named if self.module.params[key] for word in (option, self.module.params[key])]
 
     def _check(self):
         options = self._check_options()

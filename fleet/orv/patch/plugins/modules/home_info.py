@@ -142,9 +142,7 @@ def facts(program, patch):
 
 
 def main():
-    module = AnsibleModule(
-        argument_spec=dict(ctl.arguments(), patch={"type": "path"}), supports_check_mode=True
-    )
+    module = AnsibleModule(argument_spec=dict(ctl.arguments(), patch={"type": "path"}), supports_check_mode=True)
     try:
         found = facts(ctl.Ctl(module).find(), module.params["patch"])
     except ctl.CtlError as error:

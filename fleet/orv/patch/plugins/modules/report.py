@@ -112,9 +112,7 @@ def main():
             document=dict(type="dict", required=True),
             dest=dict(type="path", required=True),
             name=dict(type="str", default="fleet"),
-            formats=dict(
-                type="list", elements="str", choices=["html", "json", "csv"], default=["html", "json", "csv"]
-            ),
+            formats=dict(type="list", elements="str", choices=["html", "json", "csv"], default=["html", "json", "csv"]),
         ),
         supports_check_mode=True,
         no_log=True,  # of thousands of homes the document has megabytes: none of it goes to the host's log

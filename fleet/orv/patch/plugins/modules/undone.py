@@ -179,10 +179,7 @@ class Undoing:
 def main():
     module = AnsibleModule(
         argument_spec=dict(
-            ctl.run_arguments(),
-            transaction={"type": "str"},
-            digests={"type": "dict"},
-            patch={"type": "path"},
+            ctl.run_arguments(), transaction={"type": "str"}, digests={"type": "dict"}, patch={"type": "path"}
         ),
         mutually_exclusive=[("digests", "patch")],
         supports_check_mode=True,
