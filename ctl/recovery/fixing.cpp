@@ -42,7 +42,7 @@ int fill(const std::string &path, const std::string &text) {
     return 0;
   const int error = errno;
   if (file.isOpen())
-    static_cast<void>(ftruncate(file.get(), 0));
+    static_cast<void>(!ftruncate(file.get(), 0));
   return error;
 }
 
