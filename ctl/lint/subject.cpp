@@ -3,51 +3,17 @@
 #include <filesystem>
 
 #include "checksums.h"
-#include "judgement.h"
-#include "temporaryfolder.h"
+#include "lint/trial.h"
 #include "text.h"
 
 namespace {
 
 /// Findings of one rule on one patch that are told in full.
 constexpr std::size_t MostTold = 20;
-constexpr std::chrono::minutes TarLimit{10};
-constexpr const char *SystemPath = "/usr/sbin:/usr/bin:/sbin:/bin";
 
 std::string folderOf(const std::string &path) {
   const std::size_t slash = path.rfind('/');
   return slash == std::string::npos ? "." : path.substr(0, slash + 1);
-}
-
-std::string absolute(const std::string &path) {
-  std::error_code error;
-  const std::string result = std::filesystem::absolute(path, error);
-  if (error)
-    throw JudgementError("cannot find the current directory: " + error.message());
-  return result;
-}
-
-/// An archive that claims to be larger than the file system is not tried: that would fill it.
-void requireSpace(const Patch &patch, const std::string &folder) {
-  std::error_code error;
-  const std::filesystem::space_info space = std::filesystem::space(folder, error);
-  std::uintmax_t needed = 0;
-  for (const Member &member : patch.members)
-    needed += static_cast<std::uintmax_t>(member.size > 0 ? member.size : 0);
-  if (!error && needed > space.available)
-    throw JudgementError("no room in " + folder + " to unpack " + patch.path + ": it needs " +
-                         std::to_string(needed) + " bytes");
-}
-
-/// Runs tar as the installer does, in a folder that goes again.
-ChildResult tryTar(const Patch &patch) {
-  const TemporaryFolder folder;
-  requireSpace(patch, folder.path());
-  const ChildResult tar =
-      runChild({"tar", "-xf", absolute(patch.path)}, {SystemPath, {"LC_ALL=C"}, folder.path(), TarLimit});
-  if (tar.status == 127)
-    throw JudgementError("cannot run tar: " + tar.err);
-  return tar;
 }
 
 void readChecksums(Subject &subject) {

@@ -173,6 +173,33 @@ def test_nothing_is_left_behind(ctl, scratch, patch_dir):
     assert path.stat().st_mtime_ns == before
 
 
+ODD = {
+    "a link": lambda archive: archive.link("updated_files/link", "file"),
+    "a path twice": lambda archive: archive.file("./updated_files/file"),
+    "a file as a directory": lambda archive: archive.file("updated_files/file/below"),
+    "a directory as a file": lambda archive: archive.directory("updated_files/file"),
+    "a closed directory": lambda archive: archive.directory("updated_files/shut", 0o500),
+    "a time to come": lambda archive: archive.file("updated_files/late", mtime=int(time.time()) + 86400),
+    "a long path": lambda archive: archive.file("updated_files/" + "/".join(["x" * 50] * 6)),
+}
+
+
+@pytest.mark.parametrize("odd", [None, *ODD])
+def test_only_plain_archives_are_not_written_out(ctl, patch_dir, odd):
+    """Files larger than a limit tell whether tar has written them."""
+    archive = RawArchive(Patch("ox")).file("updated_files/file", bytes(8192)).directory("updated_files/open")
+    path = (ODD[odd](archive) if odd else archive).write(patch_dir)
+    document = ctl.document("lint", path, status=int(bool(odd)), wrapper=["prlimit", "--fsize=4096"])
+    assert ("tar-fails" in rules(document)) is bool(odd)
+
+
+@pytest.mark.parametrize("end", [700, 1536, 5000])
+def test_a_plain_archive_that_was_cut_is_found(ctl, patch_dir, end):
+    path = RawArchive(Patch("ox")).file("updated_files/file", bytes(8192)).write(patch_dir)
+    path.write_bytes(path.read_bytes()[:end])
+    assert {"incomplete-archive", "tar-fails"} & set(rules(ctl.document("lint", path, status=1)))
+
+
 def test_an_archive_larger_than_the_disk_is_not_unpacked(ctl, patch_dir, scratch):
     with open(scratch / "huge", "wb") as huge:
         huge.truncate(1 << 43)
@@ -187,6 +214,7 @@ def test_an_interruption_leaves_no_folder_behind(ctl, write, scratch, number):
     folder = scratch / "temporary"
     folder.mkdir()
     patch = Patch("ox")
+    patch.symlink("updated_files/link", "data")  # without it nothing would be written
     for index in range(8000):  # tar is at work when the signal comes
         patch.file(f"data/{index}")
     path = write(patch)
