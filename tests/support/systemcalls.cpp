@@ -228,6 +228,19 @@ int __wrap_access(const char *path, int mode) {
   return fails("access", path) ? -1 : __real_access(path, mode);
 }
 
+// The names that an optimized build gives to calls without a mode, so that the library can check that none is
+// due.
+int __real___open_2(const char *path, int flags);
+int __real___openat_2(int directory, const char *path, int flags);
+
+int __wrap___open_2(const char *path, int flags) {
+  return fails("open", path) ? -1 : __real___open_2(path, flags);
+}
+
+int __wrap___openat_2(int directory, const char *path, int flags) {
+  return fails("openat", path) ? -1 : __real___openat_2(directory, path, flags);
+}
+
 // Before glibc 2.33 these three are no functions of the library: a part of every program translates them into
 // calls that name the version of the structure.
 #if __GLIBC_PREREQ(2, 33)
