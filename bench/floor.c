@@ -3,11 +3,11 @@
 //   floor install|install-at|report HOME VERSION-FILE FILES LINES BYTES ARCHIVE...
 //
 // First, for every archive: extract the descriptor. Then, archive by archive: remove what is in the temporary
-// directory, extract everything, put it on disk, look at each entry of the tree, link it to its place under
-// the home, unlink the replaced file and the temporary name, set owner and mode, rewrite the version file and
-// append to the history with an fsync each, remove the temporary tree. A report prints the places and moves
-// nothing. Spread over the FILES files, LINES log lines of BYTES bytes in all are written, each by one open,
-// one write and one close.
+// directory, extract everything, put it on disk, look at each entry of the tree, open it, link it to its
+// place under the home, unlink the replaced file and the temporary name, set owner and mode of the open file,
+// put the moves on disk, rewrite the version file and append to the history with an fsync each, remove the
+// temporary tree. A report prints the places and moves nothing. Spread over the FILES files, LINES log lines
+// of BYTES bytes in all are written, each by one open, one write and one close.
 //
 // install-at uses names relative to the open home and log directory, which saves the system the look-up of
 // the full path. The design does not do so: another process may replace a directory that is kept open. The
@@ -84,6 +84,12 @@ static void writeLines(void) {
   }
 }
 
+static void putOnDisk(const char *name) {
+  const int directory = openDirectory(name);
+  check(syncfs(directory) == 0, name);
+  close(directory);
+}
+
 static void extract(const char *archive, const char *member) {
   check(mkdir(temporary, 0777) == 0 || access(temporary, F_OK) == 0, temporary);
   check(chdir(temporary) == 0, temporary);
@@ -142,14 +148,17 @@ static void makeDirectory(void) {
 
 static void moveFile(void) {
   struct stat old;
+  const int source = open(below, O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC);
+  check(source >= 0, below);
   if (fstatat(homeDirectory, target, &old, 0) == 0)
     check(unlinkat(homeDirectory, target, 0) == 0, path);
   else
     old = (struct stat){.st_mode = 0755, .st_uid = (uid_t)-1, .st_gid = (gid_t)-1};
   check(linkat(AT_FDCWD, below, homeDirectory, target, 0) == 0, path);
   check(unlink(below) == 0, below);
-  check(fchownat(homeDirectory, target, old.st_uid, old.st_gid, 0) == 0, path);
-  check(fchmodat(homeDirectory, target, old.st_mode & 07777, 0) == 0, path);
+  check(fchown(source, old.st_uid, old.st_gid) == 0, path);
+  check(fchmod(source, old.st_mode & 07777) == 0, path);
+  close(source);
   writeLines();
 }
 
@@ -184,10 +193,9 @@ static void rewriteVersionFile(void) {
 static void install(void) {
   static const struct visitor moving = {makeDirectory, moveFile, nothing};
   static const char line[] = "code | platform | kind | name of the patch    | PASS | user | date\n";
-  const int directory = openDirectory(temporary);
-  check(syncfs(directory) == 0, temporary);
-  close(directory);
+  putOnDisk(temporary);
   walkFrom("updated_files", &moving);
+  putOnDisk(".");
   rewriteVersionFile();
   writeTo(AT_FDCWD, history, O_APPEND, line, strlen(line), fsync);
 }

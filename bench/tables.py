@@ -5,7 +5,7 @@ from typing import NamedTuple
 
 from contenders import FLOOR, TOOL
 
-_SHOWN_CALLS = ("openat", "write", "close", "newfstatat", "unlink", "link", "chown", "chmod", "getdents64", "rmdir")
+_SHOWN_CALLS = ("openat", "write", "close", "newfstatat", "unlink", "link", "fchown", "fchmod", "getdents64", "rmdir")
 
 
 def median(trial, name, quantity):
@@ -90,7 +90,7 @@ def goals(trials):
     ]
     found += [
         Goal(f"own system calls for each file on ({key})", limit, calls_per_file(trials[key], TOOL))
-        for key, limit in (("a", 26), ("d", 60), ("e", 8))
+        for key, limit in (("a", 28), ("d", 60), ("e", 8))
         if key in trials
     ]
     if "a" in trials:
