@@ -3,6 +3,7 @@
 Run as a program: all of it, for the tests to find."""
 
 import contextlib
+import dataclasses
 import fcntl
 import functools
 import os
@@ -35,7 +36,8 @@ SYSROOTS = CHECKOUT / "build/sysroot"
 _AMD64_LIBRARIES = f"{SYSROOTS}/x86_64/usr/x86_64-linux-gnu/lib"
 
 
-class Architecture(NamedTuple):
+@dataclasses.dataclass(frozen=True, eq=False)
+class Architecture:
     preset: str
     deb: str
     triplet: str
