@@ -352,8 +352,10 @@ def two_commands(folder):
 def older_one_last(folder):
     """Names until the directory lists the lower level behind the higher one."""
     for number in range(200):
-        newer = patch(level="06100200", fixpack=f"new{number}").write(folder)
-        older = patch(level="06100100", fixpack=f"old{number}").write(folder)
+        patches = [patch(level="06100200", fixpack=f"new{number}"), patch(level="06100100", fixpack=f"old{number}")]
+        # In both orders: some file systems list the last one first, whatever its name.
+        written = {each.level: each.write(folder) for each in (patches if number % 2 else reversed(patches))}
+        newer, older = written["06100200"], written["06100100"]
         listed = os.listdir(folder)
         if listed.index(newer.name) < listed.index(older.name):
             return folder
